@@ -1,0 +1,115 @@
+#include "check.h"
+
+#include <time.h>
+#include <zlib.h>
+
+#include <cinttypes>
+#include <map>
+#include <string>
+
+#include "encoding.h"
+#include "visit.h"
+
+namespace {
+
+struct Counts {
+  uint64_t lists = 0;
+  uint64_t records = 0;
+  uint64_t contents = 0;
+  uint64_t failing = 0;  // of all of them
+};
+
+// Remembers the facts and counts the answers.
+class Counter : public Visitor {
+ public:
+  void OnHost(const Facts &facts) override { facts_ = facts; }
+  void OnList(const VisitedNode &node, const Values &, KIF_Status status, const Values &) override {
+    Count(node, &Counts::lists, status);
+  }
+  void OnRecord(const VisitedNode &node, const Values &, KIF_Status status,
+                std::string_view) override {
+    Count(node, &Counts::records, status);
+  }
+  void OnContent(const VisitedNode &node, const Values &, const cache::Stored &answer,
+                 std::string_view) override {
+    Count(node, &Counts::contents, answer.read_status());
+  }
+  void OnSet(const VisitedNode &node, KIF_Status) override { ++counts_[node.path].failing; }
+
+  const Facts &facts() const { return facts_; }
+  const std::map<std::string, Counts> &counts() const { return counts_; }
+
+ private:
+  void Count(const VisitedNode &node, uint64_t Counts::*what, KIF_Status status) {
+    Counts &counts = counts_[node.path];
+    ++(counts.*what);
+    if (status != 0) ++counts.failing;
+  }
+
+  Facts facts_;
+  std::map<std::string, Counts> counts_;
+};
+
+std::string Date(int64_t seconds) {
+  const auto moment = static_cast<time_t>(seconds);
+  struct tm parts;
+  char date[64];
+  if (moment != seconds || gmtime_r(&moment, &parts) == nullptr) return std::to_string(seconds);
+  strftime(date, sizeof(date), "%Y-%m-%d %H:%M:%S UTC", &parts);
+  return date;
+}
+
+// A fact without the quotes, which only matter where it is read back.
+std::string Shown(const std::string &text) {
+  const std::string quoted = Quoted(text);
+  return quoted.substr(1, quoted.size() - 2);
+}
+
+void PrintFacts(const CacheFile &file, const Facts &facts, FILE *stream) {
+  const auto line = [stream](const char *label, const std::string &value) {
+    if (!value.empty()) fprintf(stream, "%-10s %s\n", label, value.c_str());
+  };
+  line("format", std::to_string(file.header->major_version()) + "." +
+                     std::to_string(file.header->minor_version()));
+  line("host", Shown(facts.name));
+  std::string system;
+  for (const std::string *text : {&facts.system, &facts.release, &facts.architecture}) {
+    if (!system.empty() && !text->empty()) system += ' ';
+    system += Shown(*text);
+  }
+  line("system", system);
+  line("kernel", Shown(facts.kernelBuildDate));
+  if (facts.begin != 0) line("recorded", Date(facts.begin) + " to " + Date(facts.end));
+  line("recorder", Shown(facts.recorder));
+  line("rights", Shown(facts.rights));
+  fprintf(stream, "%-10s 0x%016" PRIx64 "%s\n", "interface", facts.signature,
+          facts.signature == InterfaceSignature() ? "" : ", not this kifcache's");
+  for (const std::string &text : facts.omitted) line("omitted", Shown(text));
+}
+
+void PrintCounts(const std::map<std::string, Counts> &counts, FILE *stream) {
+  fprintf(stream, "\n%9s %9s %9s %9s  %s\n", "lists", "records", "contents", "failing", "node");
+  for (const auto &[path, count] : counts) {
+    fprintf(stream, "%9" PRIu64 " %9" PRIu64 " %9" PRIu64 " %9" PRIu64 "  %s\n", count.lists,
+            count.records, count.contents, count.failing, Shown(path).c_str());
+  }
+}
+
+}  // namespace
+
+bool CheckFile(const char *path, const CacheFile &file, FILE *stream) {
+  const auto *content = file.header->content();
+  if (crc32_z(0, content->data(), content->size()) != file.header->checksum()) {
+    fprintf(stderr, "kifcache: %s: damaged: its bytes do not have the checksum in it\n", path);
+    return false;
+  }
+  Counter counter;
+  std::string problem;
+  if (!VisitAll(file, &counter, &problem)) {
+    fprintf(stderr, "kifcache: %s: damaged: what it has of %s\n", path, Shown(problem).c_str());
+    return false;
+  }
+  PrintFacts(file, counter.facts(), stream);
+  PrintCounts(counter.counts(), stream);
+  return true;
+}

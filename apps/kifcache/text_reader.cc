@@ -1,0 +1,489 @@
+#include "text_reader.h"
+
+#include <stdarg.h>
+#include <stdio.h>
+
+#include <charconv>
+#include <cstring>
+#include <limits>
+
+namespace {
+
+constexpr uint32_t kMostContent = uint32_t{64} << 20;  // of a content that is written out
+
+// A number as it is written: the 64 bits of it, and whether it stands below zero.
+struct Number {
+  uint64_t bits = 0;
+  bool negative = false;
+};
+
+bool ParseNumber(std::string_view word, Number *number) {
+  number->negative = word.starts_with('-');
+  if (number->negative) word.remove_prefix(1);
+  int base = 10;
+  if (word.starts_with("0x") || word.starts_with("0X")) {
+    word.remove_prefix(2);
+    base = 16;
+  }
+  const auto [end, error] =
+      std::from_chars(word.data(), word.data() + word.size(), number->bits, base);
+  if (word.empty() || error != std::errc() || end != word.data() + word.size()) return false;
+  if (!number->negative) return true;
+  if (number->bits > uint64_t{1} << 63) return false;
+  number->bits = 0 - number->bits;
+  return true;
+}
+
+// Whether the number's bits stand for it in a field of `size` bytes, with or without a sign.
+bool Fits(const Number &number, uint32_t size) {
+  const auto value = static_cast<int64_t>(number.bits);
+  if (number.negative) return size == 8 || value >= -(int64_t{1} << (size * 8 - 1));
+  return size == 8 || number.bits >> (size * 8) == 0;
+}
+
+int HexDigit(char digit) {
+  if (digit >= '0' && digit <= '9') return digit - '0';
+  if (digit >= 'a' && digit <= 'f') return digit - 'a' + 10;
+  if (digit >= 'A' && digit <= 'F') return digit - 'A' + 10;
+  return -1;
+}
+
+bool ParseHex(std::string_view digits, std::string *bytes) {
+  if (digits.size() % 2 != 0) return false;
+  bytes->clear();
+  for (size_t i = 0; i < digits.size(); i += 2) {
+    const int high = HexDigit(digits[i]);
+    const int low = HexDigit(digits[i + 1]);
+    if (high < 0 || low < 0) return false;
+    bytes->push_back(static_cast<char>(high * 16 + low));
+  }
+  return true;
+}
+
+enum class PartType { kUnsigned, kSigned, kText, kHex };
+
+// Where a part of a record goes.
+struct Part {
+  uint32_t offset;
+  uint32_t size;  // in bytes; of hex and of a text given by offset: as many as there are
+  PartType type;
+};
+
+struct TypeName {
+  const char *name;
+  uint32_t size;
+  PartType type;
+};
+constexpr TypeName kTypeNames[] = {
+    {"u8", 1, PartType::kUnsigned},  {"u16", 2, PartType::kUnsigned},
+    {"u32", 4, PartType::kUnsigned}, {"u64", 8, PartType::kUnsigned},
+    {"i32", 4, PartType::kSigned},   {"text", 0, PartType::kText},
+    {"hex", 0, PartType::kHex},
+};
+
+class Reader {
+ public:
+  Reader(std::string_view text, const char *name, HostModel *model)
+      : rest_(text), name_(name), model_(model) {}
+
+  bool Read();
+
+ private:
+  // Each reads what is left of the line, or the part of it that its name says. False: an error,
+  // which has been said.
+  bool ReadLine();
+  bool ReadHost();
+  bool ReadFact(std::string_view key);
+  bool ReadList();
+  bool ReadRecord();
+  bool ReadContent();
+  bool ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasStatus);
+  bool ReadSet();
+  bool ReadNode(const char *NodeOffers::*parameters, const char *what, const NodeInfo **node);
+  bool ReadSelector(const NodeInfo &node, const char *parameters, Values *values);
+  bool ReadValue(Value *value);
+  bool ReadPart(const NodeInfo &node, std::string *record);
+  bool FindPart(const NodeInfo &node, std::string_view name, Part *part);
+  bool FindPartByOffset(std::string_view name, Part *part);
+  bool ReadPartText(const Part &part, std::string_view name, std::string *bytes);
+  bool ReadPartNumber(const Part &part, std::string_view name, std::string *bytes);
+  bool ReadText(std::string *text);
+  bool ReadPlainText(std::string *text, const char *what);
+  bool ReadNumber(const char *what, Number *number);
+  bool ReadUnsigned32(const char *what, uint32_t *number);
+  bool ReadEndOfLine();
+
+  // What stands next on the line. A word ends at a blank, or after a '=' inside it.
+  void SkipBlanks();
+  bool AtEnd() { return SkipBlanks(), line_.empty(); }
+  bool AtText() { return SkipBlanks(), line_.starts_with('"'); }
+  std::string_view NextWord(bool stopAtEquals);
+  bool TakeWord(std::string_view word);
+
+  bool Fail(const char *format, ...) __attribute__((format(printf, 2, 3)));
+
+  std::string_view rest_;
+  std::string_view line_;
+  uint32_t lineNumber_ = 0;
+  const char *name_;
+  HostModel *model_;
+  Values values_;
+  Values entries_;
+  std::string bytes_;
+};
+
+bool Reader::Fail(const char *format, ...) {
+  fprintf(stderr, "%s:%u: ", name_, lineNumber_);
+  va_list arguments;
+  va_start(arguments, format);
+  vfprintf(stderr, format, arguments);
+  va_end(arguments);
+  fputc('\n', stderr);
+  return false;
+}
+
+#define PRINTED(view) static_cast<int>((view).size() < 80 ? (view).size() : 80), (view).data()
+
+void Reader::SkipBlanks() {
+  const size_t start = line_.find_first_not_of(" \t");
+  line_.remove_prefix(start == line_.npos ? line_.size() : start);
+}
+
+std::string_view Reader::NextWord(bool stopAtEquals) {
+  SkipBlanks();
+  size_t end = line_.find_first_of(" \t");
+  if (end == line_.npos) end = line_.size();
+  if (stopAtEquals) {
+    const size_t equals = line_.find('=');
+    if (equals < end) end = equals + 1;
+  }
+  const std::string_view word = line_.substr(0, end);
+  line_.remove_prefix(end);
+  return word;
+}
+
+bool Reader::TakeWord(std::string_view word) {
+  const std::string_view before = line_;
+  if (NextWord(false) == word) return true;
+  line_ = before;
+  return false;
+}
+
+bool Reader::Read() {
+  while (!rest_.empty()) {
+    const size_t end = rest_.find('\n');
+    line_ = rest_.substr(0, end);
+    rest_.remove_prefix(end == rest_.npos ? rest_.size() : end + 1);
+    ++lineNumber_;
+    if (line_.ends_with('\r')) line_.remove_suffix(1);
+    if (AtEnd() || line_.starts_with('#')) continue;
+    if (!ReadLine() || !ReadEndOfLine()) return false;
+  }
+  uint32_t firstLine = 0;
+  if (!model_->Sort(&lineNumber_, &firstLine)) {
+    return Fail("the same was given in line %u", firstLine);
+  }
+  return true;
+}
+
+bool Reader::ReadLine() {
+  const std::string_view kind = NextWord(false);
+  if (kind == "host") return ReadHost();
+  if (kind == "list") return ReadList();
+  if (kind == "record") return ReadRecord();
+  if (kind == "content") return ReadContent();
+  if (kind == "set") return ReadSet();
+  return Fail("a line begins with host, list, record, content or set, not with \"%.*s\"",
+              PRINTED(kind));
+}
+
+bool Reader::ReadEndOfLine() {
+  return AtEnd() || Fail("unexpected \"%.*s\"", PRINTED(line_));
+}
+
+bool Reader::ReadHost() {
+  return ReadFact(NextWord(false));
+}
+
+bool Reader::ReadFact(std::string_view key) {
+  Facts &facts = model_->facts;
+  for (const TextFact &fact : kTextFacts) {
+    if (key == fact.name) return ReadPlainText(&(facts.*fact.text), fact.name);
+  }
+  if (key == "omitted") return ReadPlainText(&facts.omitted.emplace_back(), "omitted");
+  Number number;
+  if (key == "signature") {
+    if (!ReadNumber("signature", &number)) return false;
+    facts.signature = number.bits;
+    return true;
+  }
+  if (key == "begin" || key == "end") {
+    if (!ReadNumber("time", &number)) return false;
+    (key == "begin" ? facts.begin : facts.end) = static_cast<int64_t>(number.bits);
+    return true;
+  }
+  return Fail("unknown fact \"%.*s\"", PRINTED(key));
+}
+
+// Reads a node that has `what`; `parameters` is the member of its offers that says so.
+bool Reader::ReadNode(const char *NodeOffers::*parameters, const char *what,
+                      const NodeInfo **node) {
+  const std::string_view path = NextWord(false);
+  *node = FindNodeByPath(path.data(), path.size());
+  if (*node == nullptr) return Fail("no node is named \"%.*s\"", PRINTED(path));
+  if (parameters != nullptr && (*node)->offers.*parameters == nullptr) {
+    return Fail("%s has no %s", (*node)->path, what);
+  }
+  return true;
+}
+
+bool Reader::ReadSelector(const NodeInfo &node, const char *parameters, Values *values) {
+  values->clear();
+  while (!TakeWord("=")) {
+    if (AtEnd()) return Fail("\"=\" is missing");
+    if (!ReadValue(&values->emplace_back())) return false;
+  }
+  const size_t wanted = strlen(parameters);
+  if (values->size() == wanted) return true;
+  return Fail("%s takes %zu parameter%s here, not %zu", node.path, wanted, wanted == 1 ? "" : "s",
+              values->size());
+}
+
+bool Reader::ReadValue(Value *value) {
+  if (AtText()) {
+    value->kind = cache::Kind::Text;
+    return ReadPlainText(&value->text, "parameter");
+  }
+  const std::string_view word = NextWord(false);
+  Number number;
+  if (word == "null") {
+    value->kind = cache::Kind::Null;
+  } else if (ParseNumber(word, &number)) {
+    value->integer = static_cast<int64_t>(number.bits);
+  } else {
+    return Fail("\"%.*s\" is no integer, text or null", PRINTED(word));
+  }
+  return true;
+}
+
+bool Reader::ReadNumber(const char *what, Number *number) {
+  const std::string_view word = NextWord(false);
+  return ParseNumber(word, number) || Fail("%s \"%.*s\" is no number", what, PRINTED(word));
+}
+
+bool Reader::ReadUnsigned32(const char *what, uint32_t *number) {
+  Number parsed;
+  if (!ReadNumber(what, &parsed)) return false;
+  if (parsed.negative || !Fits(parsed, 4)) return Fail("%s is out of range", what);
+  *number = static_cast<uint32_t>(parsed.bits);
+  return true;
+}
+
+// Reads a text in quotes.
+bool Reader::ReadText(std::string *text) {
+  text->clear();
+  if (!AtText()) return Fail("a text in double quotes is missing");
+  for (size_t i = 1; i < line_.size(); ++i) {
+    if (line_[i] == '"') {
+      line_.remove_prefix(i + 1);
+      if (!line_.empty() && line_[0] != ' ' && line_[0] != '\t') {
+        return Fail("a text ends before \"%.*s\"", PRINTED(line_));
+      }
+      return true;
+    }
+    if (line_[i] != '\\') {
+      text->push_back(line_[i]);
+      continue;
+    }
+    constexpr char kLetters[] = "\"\\ntr";
+    constexpr char kMeant[] = "\"\\\n\t\r";
+    const char letter = ++i < line_.size() ? line_[i] : '\0';
+    const char *found = letter != '\0' ? strchr(kLetters, letter) : nullptr;
+    std::string byte;
+    if (found != nullptr) {
+      text->push_back(kMeant[found - kLetters]);
+    } else if (letter == 'x' && i + 2 < line_.size() && ParseHex(line_.substr(i + 1, 2), &byte)) {
+      text->append(byte);
+      i += 2;
+    } else {
+      return Fail("a backslash stands before \", \\, n, t, r or xHH only");
+    }
+  }
+  return Fail("a text has no closing quote");
+}
+
+// Reads a text that cannot hold a NUL.
+bool Reader::ReadPlainText(std::string *text, const char *what) {
+  if (!ReadText(text)) return false;
+  return text->find('\0') == text->npos || Fail("a %s cannot hold a NUL", what);
+}
+
+bool Reader::ReadList() {
+  const NodeInfo *node;
+  if (!ReadNode(&NodeOffers::listParameters, "instance lists", &node)) return false;
+  if (!ReadSelector(*node, node->offers.listParameters, &values_)) return false;
+  KIF_Status status = 0;
+  entries_.clear();
+  if (TakeWord("status")) {
+    if (!ReadUnsigned32("status", &status)) return false;
+  } else {
+    while (!AtEnd()) {
+      if (!ReadValue(&entries_.emplace_back())) return false;
+    }
+  }
+  model_->AddList(IndexOf(*node), values_, status, entries_, lineNumber_);
+  return true;
+}
+
+bool Reader::ReadRecord() {
+  const NodeInfo *node;
+  if (!ReadNode(&NodeOffers::recordParameters, "records", &node)) return false;
+  if (!ReadSelector(*node, node->offers.recordParameters, &values_)) return false;
+  KIF_Status status = 0;
+  bytes_.clear();
+  if (TakeWord("status")) {
+    if (!ReadUnsigned32("status", &status)) return false;
+  } else {
+    bytes_.assign(node->offers.recordSize, '\0');
+    while (!AtEnd()) {
+      if (!ReadPart(*node, &bytes_)) return false;
+    }
+  }
+  model_->AddRecord(IndexOf(*node), values_, status, bytes_, lineNumber_);
+  return true;
+}
+
+bool Reader::FindPartByOffset(std::string_view name, Part *part) {
+  const size_t colon = name.find(':');
+  Number offset;
+  if (colon != name.npos && ParseNumber(name.substr(0, colon), &offset) && Fits(offset, 4) &&
+      !offset.negative) {
+    for (const TypeName &type : kTypeNames) {
+      if (name.substr(colon + 1) != type.name) continue;
+      *part = {static_cast<uint32_t>(offset.bits), type.size, type.type};
+      return true;
+    }
+  }
+  return Fail("\"@%.*s\" is not @OFFSET:TYPE with a TYPE of u8, u16, u32, u64, i32, text or hex",
+              PRINTED(name));
+}
+
+bool Reader::FindPart(const NodeInfo &node, std::string_view name, Part *part) {
+  if (name.starts_with('@')) return FindPartByOffset(name.substr(1), part);
+  for (const NodeField *field = node.fields; field->name != nullptr; ++field) {
+    if (name != field->name) continue;
+    const PartType type = field->type == FieldType::kText     ? PartType::kText
+                          : field->type == FieldType::kSigned ? PartType::kSigned
+                                                              : PartType::kUnsigned;
+    *part = {field->offset, field->size, type};
+    return true;
+  }
+  return Fail("%s has no field \"%.*s\"", node.path, PRINTED(name));
+}
+
+bool Reader::ReadPartText(const Part &part, std::string_view name, std::string *bytes) {
+  if (!ReadText(bytes)) return false;
+  if (part.size == 0) return true;
+  if (bytes->size() > part.size) {
+    return Fail("the text of %.*s is longer than its %u bytes", PRINTED(name), part.size);
+  }
+  bytes->resize(part.size, '\0');
+  return true;
+}
+
+bool Reader::ReadPartNumber(const Part &part, std::string_view name, std::string *bytes) {
+  const std::string_view word = NextWord(false);
+  Number number;
+  if (!ParseNumber(word, &number)) {
+    return Fail("\"%.*s\", the value of %.*s, is no number", PRINTED(word), PRINTED(name));
+  }
+  if (!Fits(number, part.size)) {
+    return Fail("%.*s does not fit into the %u bytes of %.*s", PRINTED(word), part.size,
+                PRINTED(name));
+  }
+  bytes->clear();
+  for (uint32_t i = 0; i < part.size; ++i) {
+    bytes->push_back(static_cast<char>(number.bits >> (8 * i)));
+  }
+  return true;
+}
+
+bool Reader::ReadPart(const NodeInfo &node, std::string *record) {
+  std::string_view name = NextWord(true);
+  if (!name.ends_with('=')) return Fail("\"%.*s\" is not NAME=VALUE", PRINTED(name));
+  name.remove_suffix(1);
+  Part part = {};
+  std::string bytes;
+  if (!FindPart(node, name, &part)) return false;
+  if (part.type == PartType::kText) {
+    if (!ReadPartText(part, name, &bytes)) return false;
+  } else if (part.type == PartType::kHex) {
+    const std::string_view digits = NextWord(false);
+    if (!ParseHex(digits, &bytes)) {
+      return Fail("\"%.*s\" are no pairs of hexadecimal digits", PRINTED(digits));
+    }
+  } else if (!ReadPartNumber(part, name, &bytes)) {
+    return false;
+  }
+  if (part.offset > record->size() || bytes.size() > record->size() - part.offset) {
+    return Fail("%.*s reaches beyond the %zu bytes of the record", PRINTED(name), record->size());
+  }
+  record->replace(part.offset, bytes.size(), bytes);
+  return true;
+}
+
+bool Reader::ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasStatus) {
+  if (TakeWord("length")) {
+    *hasLength = true;
+    return ReadUnsigned32("length", &content->total);
+  }
+  if (TakeWord("status")) {
+    *hasStatus = true;
+    return ReadUnsigned32("status", &content->readStatus);
+  }
+  if (*hasLength || *hasStatus) return Fail("pieces stand before length and status");
+  std::string piece;
+  if (AtText()) {
+    if (!ReadText(&piece)) return false;
+  } else {
+    std::string_view word = NextWord(false);
+    if (!word.starts_with("hex=") || !ParseHex(word.substr(4), &piece)) {
+      return Fail("\"%.*s\" is no text, hex=DIGITS, length or status", PRINTED(word));
+    }
+  }
+  content->bytes += piece;
+  return content->bytes.size() <= kMostContent || Fail("a content is at most 64 MiB long");
+}
+
+bool Reader::ReadContent() {
+  const NodeInfo *node;
+  if (!ReadNode(&NodeOffers::contentParameters, "content", &node)) return false;
+  if (!ReadSelector(*node, node->offers.contentParameters, &values_)) return false;
+  ContentAnswer content;
+  bool hasLength = false;
+  bool hasStatus = false;
+  while (!AtEnd()) {
+    if (!ReadContentWord(&content, &hasLength, &hasStatus)) return false;
+  }
+  if (!hasLength) content.total = static_cast<uint32_t>(content.bytes.size());
+  if (hasStatus && !hasLength && content.bytes.empty()) content.lengthStatus = content.readStatus;
+  model_->AddContent(IndexOf(*node), values_, content, lineNumber_);
+  return true;
+}
+
+bool Reader::ReadSet() {
+  const NodeInfo *node;
+  if (!ReadNode(nullptr, "", &node)) return false;
+  if (!node->offers.settable) return Fail("%s cannot be written", node->path);
+  NodeModel &model = model_->nodes[IndexOf(*node)];
+  if (model.setLine != 0) return Fail("the same was given in line %u", model.setLine);
+  model.setLine = lineNumber_;
+  if (!TakeWord("=") || !TakeWord("status")) return Fail("\"= status S\" is missing");
+  return ReadUnsigned32("status", &model.setStatus);
+}
+
+}  // namespace
+
+bool ReadText(std::string_view text, const char *name, HostModel *model) {
+  return Reader(text, name, model).Read();
+}

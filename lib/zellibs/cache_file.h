@@ -1,0 +1,45 @@
+// Reading a cache file: see docs/cache-format.md. The file comes from another machine and is
+// not trusted: opening verifies its structure, and every place and length in it is checked when it
+// is used.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "cache_generated.h"
+#include "kif/zellibs.h"
+#include "nodes.h"
+
+constexpr uint16_t kCacheMajorVersion = 1;
+constexpr uint16_t kCacheMinorVersion = 0;
+
+// An open cache file; all zero: none. Everything points into the mapped file.
+struct CacheFile {
+  const uint8_t *map;
+  size_t size;
+  const cache::File *header;
+  const cache::Content *content;
+  const cache::Node *nodes[kNodeCount];  // by NodeIndex; null where the file has nothing of it
+  const cache::Parameter *parameters;
+  uint32_t parameterCount;
+  const uint8_t *bytes;
+  uint32_t byteCount;
+};
+
+// Opens the cache file at `path`. The status tells apart: no such file, no permission, not a cache
+// file (nor any other kind of file), damaged, and of another major version. `*file` is written only
+// when it is KIF_STATUS_OK; CloseCacheFile releases it.
+KIF_Status OpenCacheFile(const char *path, CacheFile *file);
+void CloseCacheFile(CacheFile *file);
+
+// Whether a run of parameters or bytes lies within the file.
+bool HasParameters(const CacheFile &file, uint32_t first, uint32_t count);
+bool HasBytes(const CacheFile &file, uint32_t place, uint32_t length);
+
+// The zero-ended text of a parameter of kind Text; null where it does not lie within the file.
+const char *ParameterText(const CacheFile &file, const cache::Parameter &parameter);
+
+// A text of the file that may be missing.
+inline const char *TextOrEmpty(const flatbuffers::String *text) {
+  return text != nullptr ? text->c_str() : "";
+}

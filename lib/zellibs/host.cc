@@ -1,0 +1,58 @@
+#include "host.h"
+
+#include <cstdlib>
+#include <cstring>
+
+#include "status.h"
+
+namespace {
+
+struct Choice {
+  bool made;
+  bool live;
+  KIF_Status status;
+  const Host *host;
+};
+
+Choice choice;
+
+constexpr char kLinux[] = "linux";
+constexpr size_t kLinuxLength = sizeof(kLinux) - 1;
+
+Choice ChooseByEnvironment() {
+  const char *name = getenv("ZELLIBS_HOST");
+  if (name == nullptr || name[0] == '\0' || strcmp(name, kLinux) == 0) {
+    return {true, true, KIF_STATUS_OK, &kLinuxHost};
+  }
+  if (strncmp(name, kLinux, kLinuxLength) == 0 && name[kLinuxLength] == ':') {
+    SetLinuxRoot(name + kLinuxLength + 1);
+    return {true, true, KIF_STATUS_OK, &kLinuxHost};
+  }
+  if (strcmp(name, "none") == 0) return {true, false, KIF_STATUS_NO_HOST, nullptr};
+  const Host *recorded = nullptr;
+  const KIF_Status status = OpenRecordedHost(name, &recorded);
+  return {true, true, status, recorded};
+}
+
+const Choice &Chosen() {
+  if (!choice.made) choice = ChooseByEnvironment();
+  return choice;
+}
+
+}  // namespace
+
+KIF_Status CurrentHost(const Host **host) {
+  *host = Chosen().host;
+  return Chosen().status;
+}
+
+bool HasLiveHost() {
+  return Chosen().live;
+}
+
+KIF_Status UseRecordedHost(const char *path) {
+  const Host *recorded = nullptr;
+  const KIF_Status status = OpenRecordedHost(path, &recorded);
+  if (status == KIF_STATUS_OK) choice = {true, Chosen().live, status, recorded};
+  return status;
+}

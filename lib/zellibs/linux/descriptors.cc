@@ -1,0 +1,178 @@
+// userworld_cartel_fd_fds: /proc/PID/fd.
+#include <errno.h>
+#include <fcntl.h>
+#include <stdio.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <cstring>
+#include <iterator>
+
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "linux/linux_nodes.h"
+#include "linux/sockets.h"
+
+namespace {
+
+struct __attribute__((packed)) DescriptorRecord {
+  unsigned char unused0[4];
+  char kind[96];
+  char description[1984];
+};
+static_assert(sizeof(DescriptorRecord) == 2084);
+static_assert(offsetof(DescriptorRecord, kind) == 4 &&
+              offsetof(DescriptorRecord, description) == 100);
+
+// The process asked for last.
+struct KeptProcess {
+  int64_t id = -1;
+  Descriptor descriptors;    // its fd directory
+  bool socketsRead = false;  // those of its network namespace are known
+  bool refused = false;      // the kernel refused a descriptor; it decides on processes as a whole
+};
+
+Everlasting<KeptProcess> kept;
+
+constexpr size_t kPathSize = 32;
+
+void MakePath(int64_t process, char *path) {
+  snprintf(path, kPathSize, "/proc/%lld/fd", static_cast<long long>(process));
+}
+
+void Keep(int64_t process, int descriptors) {
+  kept->id = process;
+  kept->descriptors.Reset(descriptors);
+  kept->socketsRead = kept->refused = false;
+}
+
+KIF_Status KeepProcess(int64_t process) {
+  if (process == kept->id) return KIF_STATUS_OK;
+  char path[kPathSize];
+  MakePath(process, path);
+  Descriptor descriptors;
+  const KIF_Status status = OpenHostFile(path, O_PATH | O_DIRECTORY, &descriptors);
+  if (status == KIF_STATUS_OK) Keep(process, descriptors.Release());
+  return status;
+}
+
+constexpr char kSocket[] = "socket:[";
+
+bool BeginsWith(const char *text, const char *beginning) {
+  return strncmp(text, beginning, strlen(beginning)) == 0;
+}
+
+const char *KindOfMode(unsigned mode) {
+  switch (mode & S_IFMT) {
+    case S_IFDIR:
+      return "DIR";
+    case S_IFCHR:
+      return "CHAR";
+    case S_IFBLK:
+      return "BLOCK";
+    case S_IFIFO:
+      return "PIPE";
+    case S_IFSOCK:
+      return "SOCKET";
+    default:
+      return "FILE";
+  }
+}
+
+// In a tree taken from elsewhere there is no file to ask, only well-known names.
+const char *KindOfRecordedPath(const char *path) {
+  static constexpr const char *kCharacterDevices[] = {
+      "/dev/null", "/dev/zero", "/dev/full", "/dev/random",  "/dev/urandom",
+      "/dev/tty",  "/dev/pts/", "/dev/ptmx", "/dev/console",
+  };
+  const auto matches = [path](const char *device) { return BeginsWith(path, device); };
+  return std::any_of(std::begin(kCharacterDevices), std::end(kCharacterDevices), matches) ? "CHAR"
+                                                                                          : "FILE";
+}
+
+// The kind of the descriptor `name` of the process, whose link reads `target`. What has no place in
+// a file system shows it in its name; only the others are looked at, with what the kernel already
+// knows of them, for a file server may not answer.
+const char *KindOf(const char *name, const char *target) {
+  if (BeginsWith(target, kSocket)) return "SOCKET";
+  if (BeginsWith(target, "pipe:[")) return "PIPE";
+  if (BeginsWith(target, "anon_inode:")) return "ANON";
+  if (target[0] != '/' && strstr(target, ":[") != nullptr) return "ANON";  // "mnt:[4026531840]"
+  if (IsForeignRoot()) return KindOfRecordedPath(target);
+  struct statx file;
+  const int flags = AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT;
+  const bool known = statx(kept->descriptors.fd(), name, flags, STATX_TYPE, &file) == 0;
+  return KindOfMode(known ? file.stx_mode : S_IFREG);
+}
+
+KIF_Status ReadSocketsOfKept() {
+  if (kept->socketsRead) return KIF_STATUS_OK;
+  Descriptor process;
+  KIF_Status status = OpenBelow(kept->descriptors.fd(), "..", O_PATH | O_DIRECTORY, &process);
+  if (status == KIF_STATUS_OK) status = ReadSocketsOf(process.fd());
+  kept->socketsRead = status == KIF_STATUS_OK;
+  return status;
+}
+
+// Puts the description of the socket in place of its link's text, where there is one.
+KIF_Status NameSocket(char *text, size_t size, size_t *length) {
+  const char *place = text + strlen(kSocket);
+  uint64_t inode;
+  if (!TakeNumber(&place, &inode)) return KIF_STATUS_OK;
+  const KIF_Status status = ReadSocketsOfKept();
+  if (status == KIF_STATUS_OK && DescribeSocket(inode, text, size)) *length = strlen(text);
+  return status;
+}
+
+KIF_Status ReadLink(const char *name, char *text, size_t size, size_t *length) {
+  if (kept->refused) return KIF_STATUS_NO_PERMISSION;
+  const KIF_Status status = ReadLinkBelow(kept->descriptors.fd(), name, text, size, length);
+  kept->refused = status == KIF_STATUS_NO_PERMISSION;
+  return status;
+}
+
+}  // namespace
+
+KIF_Status ListDescriptors(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
+  int64_t process;
+  if (!IntegerAt(parent, 0, &process)) return KIF_STATUS_BAD_PARAMETER;
+  char path[kPathSize];
+  MakePath(process, path);
+  DirectoryReader descriptors;
+  KIF_Status status = descriptors.Open(path);
+  if (status != KIF_STATUS_OK) return status;
+  const int duplicate = fcntl(descriptors.fd(), F_DUPFD_CLOEXEC, 0);
+  if (duplicate < 0) return StatusOfErrno(errno);
+  Keep(process, duplicate);
+  while (const char *name = descriptors.Next()) {
+    uint64_t number;
+    if (!TakeNumber(&name, &number) || *name != '\0' || number > INT32_MAX) continue;
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(number));
+    if (status != KIF_STATUS_OK) return status;
+  }
+  std::sort(list->params, list->params + list->count,
+            [](const Param &a, const Param &b) { return a.integer < b.integer; });
+  return descriptors.status();
+}
+
+KIF_Status GetDescriptor(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  auto *descriptor = static_cast<DescriptorRecord *>(record);
+  int64_t process;
+  int64_t number;
+  if (!IntegerAt(instance, 0, &process) || !IntegerAt(instance, 1, &number)) {
+    return KIF_STATUS_BAD_PARAMETER;
+  }
+  KIF_Status status = KeepProcess(process);
+  if (status != KIF_STATUS_OK) return status;
+  char name[24];
+  snprintf(name, sizeof(name), "%lld", static_cast<long long>(number));
+  char text[4096];  // the kernel's longest pathname
+  size_t length;
+  status = ReadLink(name, text, sizeof(text), &length);
+  if (status != KIF_STATUS_OK) return status;
+  snprintf(descriptor->kind, sizeof(descriptor->kind), "%s", KindOf(name, text));
+  if (BeginsWith(text, kSocket)) status = NameSocket(text, sizeof(text), &length);
+  CopyText(descriptor->description, sizeof(descriptor->description), text, length);
+  return status;
+}

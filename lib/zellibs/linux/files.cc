@@ -1,0 +1,165 @@
+#include "linux/files.h"
+
+#include <errno.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <cstring>
+
+#include "host.h"
+#include "printable/printable.h"
+#include "status.h"
+
+namespace {
+
+// The directory that stands for "/"; null: the machine's own. The environment that it comes from
+// stays as it is.
+const char *hostRoot;
+
+KIF_Status Opened(int fd, Descriptor *file) {
+  file->Reset(fd);
+  return fd >= 0 ? KIF_STATUS_OK : StatusOfErrno(errno);
+}
+
+KIF_Status ReadOpened(KIF_Status status, const Descriptor &file, char *buffer, size_t size,
+                      size_t *length) {
+  size_t filled = 0;
+  while (status == KIF_STATUS_OK && filled < size - 1) {
+    const ssize_t got = read(file.fd(), buffer + filled, size - 1 - filled);
+    if (got == 0) break;
+    if (got > 0) {
+      filled += static_cast<size_t>(got);
+    } else if (errno != EINTR) {
+      status = StatusOfErrno(errno);
+    }
+  }
+  buffer[filled] = '\0';
+  if (length != nullptr) *length = filled;
+  return status;
+}
+
+}  // namespace
+
+void SetLinuxRoot(const char *root) {
+  hostRoot = strcmp(root, "/") == 0 || root[0] == '\0' ? nullptr : root;
+}
+
+bool IsForeignRoot() {
+  return hostRoot != nullptr;
+}
+
+KIF_Status OpenHostFile(const char *path, int flags, Descriptor *file) {
+  if (hostRoot == nullptr) return Opened(open(path, flags | O_CLOEXEC, 0), file);
+  const Descriptor root(open(hostRoot, O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!root.valid()) return StatusOfErrno(errno);
+  return OpenBelow(root.fd(), path[1] != '\0' ? path + 1 : ".", flags, file);
+}
+
+KIF_Status OpenBelow(int directory, const char *path, int flags, Descriptor *file) {
+  return Opened(openat(directory, path, flags | O_CLOEXEC, 0), file);
+}
+
+KIF_Status ReadHostFile(const char *path, char *buffer, size_t size, size_t *length) {
+  Descriptor file;
+  const KIF_Status status = OpenHostFile(path, O_RDONLY, &file);
+  return ReadOpened(status, file, buffer, size, length);
+}
+
+KIF_Status ReadBelow(int directory, const char *path, char *buffer, size_t size, size_t *length) {
+  Descriptor file;
+  const KIF_Status status = OpenBelow(directory, path, O_RDONLY, &file);
+  return ReadOpened(status, file, buffer, size, length);
+}
+
+KIF_Status ReadLinkBelow(int directory, const char *path, char *buffer, size_t size,
+                         size_t *length) {
+  const ssize_t got = readlinkat(directory, path, buffer, size - 1);
+  buffer[got > 0 ? got : 0] = '\0';
+  if (length != nullptr) *length = got > 0 ? static_cast<size_t>(got) : 0;
+  return got >= 0 ? KIF_STATUS_OK : StatusOfErrno(errno);
+}
+
+bool Bytes::Reserve(size_t more) {
+  if (more >= SIZE_MAX / 2 - size_) return false;
+  const size_t wanted = size_ + more + 1;
+  if (wanted <= capacity_) return true;
+  const size_t grown = wanted > capacity_ * 2 ? wanted : capacity_ * 2;
+  void *data = realloc(data_, grown);
+  if (data == nullptr) return false;
+  data_ = static_cast<char *>(data);
+  capacity_ = grown;
+  data_[size_] = '\0';
+  return true;
+}
+
+bool Bytes::Append(const void *bytes, size_t size) {
+  if (!Reserve(size)) return false;
+  if (size > 0) memcpy(data_ + size_, bytes, size);
+  size_ += size;
+  data_[size_] = '\0';
+  return true;
+}
+
+KIF_Status Bytes::ReadAll(int file, size_t most) {
+  constexpr size_t kStep = 16384;
+  const size_t before = size_;
+  while (true) {
+    if (!Reserve(kStep)) return KIF_STATUS_NO_MEMORY;
+    const ssize_t got = read(file, data_ + size_, capacity_ - size_ - 1);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return StatusOfErrno(errno);
+    size_ += static_cast<size_t>(got);
+    data_[size_] = '\0';
+    if (got == 0) return KIF_STATUS_OK;
+    if (size_ - before > most) return KIF_STATUS_TOO_LARGE;
+  }
+}
+
+KIF_Status DirectoryReader::Open(const char *path) {
+  filled_ = place_ = 0;
+  status_ = OpenHostFile(path, O_RDONLY | O_DIRECTORY, &directory_);
+  return status_;
+}
+
+KIF_Status DirectoryReader::OpenBelow(int directory, const char *path) {
+  filled_ = place_ = 0;
+  status_ = ::OpenBelow(directory, path, O_RDONLY | O_DIRECTORY, &directory_);
+  return status_;
+}
+
+const char *DirectoryReader::Next() {
+  while (status_ == KIF_STATUS_OK) {
+    if (place_ == filled_) {
+      const ssize_t got = getdents64(directory_.fd(), block_, sizeof(block_));
+      if (got < 0) status_ = StatusOfErrno(errno);
+      if (got <= 0) return nullptr;
+      filled_ = static_cast<size_t>(got);
+      place_ = 0;
+    }
+    const auto *entry = reinterpret_cast<const dirent64 *>(block_ + place_);
+    place_ += entry->d_reclen;
+    const char *name = entry->d_name;
+    if (strcmp(name, ".") != 0 && strcmp(name, "..") != 0) return name;
+  }
+  return nullptr;
+}
+
+void CopyText(char *field, size_t size, const char *text, size_t length) {
+  const size_t kept = printable::CutAtCharacter(text, length, size - 1);
+  memcpy(field, text, kept);
+  printable::MaskControls(field, kept);
+  field[kept] = '\0';
+}
+
+bool TakeNumber(const char **text, uint64_t *number) {
+  const char *digit = *text;
+  uint64_t value = 0;
+  for (; *digit >= '0' && *digit <= '9'; ++digit) {
+    const auto next = static_cast<uint64_t>(*digit - '0');
+    value = value > (UINT64_MAX - next) / 10 ? UINT64_MAX : value * 10 + next;
+  }
+  if (digit == *text) return false;
+  *text = digit;
+  *number = value;
+  return true;
+}

@@ -1,0 +1,122 @@
+// Reading the files of the Linux machine that is the host: below its root, without allocation
+// where a bound is known, and with failures as statuses.
+#pragma once
+
+#include <dirent.h>
+#include <unistd.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+
+#include "kif/zellibs.h"
+
+// An open file descriptor, closed with its owner. -1: none.
+class Descriptor {
+ public:
+  explicit Descriptor(int fd = -1) : fd_(fd) {}
+  ~Descriptor() { Reset(-1); }
+  Descriptor(Descriptor &&other) noexcept : fd_(other.Release()) {}
+  Descriptor &operator=(Descriptor &&other) noexcept {
+    Reset(other.Release());
+    return *this;
+  }
+
+  int fd() const { return fd_; }
+  bool valid() const { return fd_ >= 0; }
+  int Release() {
+    const int fd = fd_;
+    fd_ = -1;
+    return fd;
+  }
+  void Reset(int fd) {
+    if (fd_ >= 0) close(fd_);
+    fd_ = fd;
+  }
+
+ private:
+  int fd_;
+};
+
+// A growing run of bytes, always followed by a NUL that does not count.
+class Bytes {
+ public:
+  Bytes() = default;
+  ~Bytes() { free(data_); }
+  Bytes(const Bytes &) = delete;
+  Bytes &operator=(const Bytes &) = delete;
+
+  // Makes room for `more` bytes behind the present ones. False without memory.
+  bool Reserve(size_t more);
+  bool Append(const void *bytes, size_t size);
+  void Clear() { size_ = 0; }
+
+  // Forgets the bytes behind the first `size`, of which there are that many.
+  void Truncate(size_t size) {
+    size_ = size;
+    if (data_ != nullptr) data_[size] = '\0';
+  }
+
+  char *data() { return data_; }
+  const char *text() const { return data_ != nullptr ? data_ : ""; }
+  size_t size() const { return size_; }
+
+  // Reads `file` from its present place to its end behind the present bytes; more than `most`
+  // bytes are KIF_STATUS_TOO_LARGE.
+  KIF_Status ReadAll(int file, size_t most = size_t{64} << 20);
+
+ private:
+  char *data_ = nullptr;
+  size_t size_ = 0;
+  size_t capacity_ = 0;
+};
+
+// True where the host is a tree of files taken from elsewhere, and system calls about processes
+// or devices do not speak of it.
+bool IsForeignRoot();
+
+// Opens `path`, absolute on the host ("/proc/uptime"), with O_CLOEXEC added to `flags`. The status
+// tells why it could not.
+KIF_Status OpenHostFile(const char *path, int flags, Descriptor *file);
+
+// The same for a path below an open directory.
+KIF_Status OpenBelow(int directory, const char *path, int flags, Descriptor *file);
+
+// Reads a file, at most `size` - 1 bytes of it, into `buffer` and terminates it; `*length` (may be
+// null) is the number of bytes read.
+KIF_Status ReadHostFile(const char *path, char *buffer, size_t size, size_t *length = nullptr);
+KIF_Status ReadBelow(int directory, const char *path, char *buffer, size_t size,
+                     size_t *length = nullptr);
+
+// The target of a symbolic link below `directory` (AT_FDCWD with an absolute path of the host is
+// not for here), terminated, at most `size` - 1 bytes of it.
+KIF_Status ReadLinkBelow(int directory, const char *path, char *buffer, size_t size,
+                         size_t *length = nullptr);
+
+// The entries of an open directory, in the kernel's order, without "." and "..".
+class DirectoryReader {
+ public:
+  // Opens the directory at `path` below `directory`, or an absolute one of the host.
+  KIF_Status Open(const char *path);
+  KIF_Status OpenBelow(int directory, const char *path);
+
+  // The next name, valid up to the next call; null at the end or after a failure (status()).
+  const char *Next();
+  KIF_Status status() const { return status_; }
+  int fd() const { return directory_.fd(); }
+
+ private:
+  Descriptor directory_;
+  KIF_Status status_ = 0;
+  size_t filled_ = 0;
+  size_t place_ = 0;
+  alignas(8) char block_[8192];
+};
+
+// Copies a text of the machine into a field of `size` bytes: printable, cut at a character's end,
+// terminated.
+void CopyText(char *field, size_t size, const char *text, size_t length);
+
+// Converts the decimal number that `text` begins with and moves `*text` behind it; false where
+// there is none. Numbers beyond 64 bits become the largest one.
+bool TakeNumber(const char **text, uint64_t *number);

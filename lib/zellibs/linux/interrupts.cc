@@ -1,0 +1,209 @@
+// hardware_interrupts: the numbered rows of /proc/interrupts.
+#include <fcntl.h>
+
+#include <cstddef>
+#include <cstring>
+
+#include "linux/array.h"
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "linux/linux_nodes.h"
+
+namespace {
+
+struct __attribute__((packed)) UsageRecord {
+  uint8_t unused0[8];
+  uint8_t hasDevices;
+  uint8_t unused9[3];
+};
+static_assert(sizeof(UsageRecord) == 12);
+static_assert(offsetof(UsageRecord, hasDevices) == 8);
+
+struct Row {
+  uint64_t number;
+  const char *counts;  // behind the colon; the row ends with the line
+};
+
+// The file, as it was when the rows were last listed, and the count that was read last: counts are
+// asked for in their order.
+struct Interrupts {
+  bool read = false;
+  Bytes text;
+  Array<Row> rows;
+  size_t cpus = 0;
+  size_t lastRow = 0;
+  size_t nextCpu = 0;
+  const char *nextCount = nullptr;  // null: none was read yet
+};
+
+Everlasting<Interrupts> interrupts;
+
+const char *SkipBlanks(const char *text) {
+  while (*text == ' ') ++text;
+  return text;
+}
+
+size_t CountWords(const char *line) {
+  size_t count = 0;
+  for (line = SkipBlanks(line); *line != '\0' && *line != '\n'; line = SkipBlanks(line)) {
+    ++count;
+    line += strcspn(line, " \n");
+  }
+  return count;
+}
+
+const char *NextLine(const char *line) {
+  line += strcspn(line, "\n");
+  return *line == '\n' ? line + 1 : line;
+}
+
+// The first line names the columns, one for each CPU online; rows without a number are those of
+// the processor itself.
+KIF_Status FindRows(const char *line) {
+  interrupts->cpus = CountWords(line);
+  for (line = NextLine(line); *line != '\0'; line = NextLine(line)) {
+    const char *place = SkipBlanks(line);
+    uint64_t number;
+    if (!TakeNumber(&place, &number) || *place != ':') continue;
+    if (!interrupts->rows.Append({number, place + 1})) return KIF_STATUS_NO_MEMORY;
+  }
+  return KIF_STATUS_OK;
+}
+
+KIF_Status ReadInterrupts() {
+  interrupts->read = false;
+  interrupts->text.Clear();
+  interrupts->rows.Clear();
+  interrupts->lastRow = 0;
+  interrupts->nextCount = nullptr;
+  Descriptor file;
+  KIF_Status status = OpenHostFile("/proc/interrupts", O_RDONLY, &file);
+  if (status == KIF_STATUS_OK) status = interrupts->text.ReadAll(file.fd());
+  if (status == KIF_STATUS_OK) status = FindRows(interrupts->text.text());
+  interrupts->read = status == KIF_STATUS_OK;
+  return status;
+}
+
+// Finds the row that `list` selects. Rows are read in their order, many times each, so the search
+// begins at the last one.
+KIF_Status FindRow(const KIF_ParamList *list, size_t *row) {
+  const KIF_Status status = interrupts->read ? KIF_STATUS_OK : ReadInterrupts();
+  if (status != KIF_STATUS_OK) return status;
+  int64_t number;
+  if (!IntegerAt(list, 0, &number)) return KIF_STATUS_BAD_PARAMETER;
+  const size_t count = interrupts->rows.size();
+  for (size_t i = 0; i < count; ++i) {
+    *row = (interrupts->lastRow + i) % count;
+    if (interrupts->rows[*row].number == static_cast<uint64_t>(number)) return KIF_STATUS_OK;
+  }
+  return KIF_STATUS_NOT_FOUND;
+}
+
+// Moves behind the count of `cpu` in a row, and gives it. False where the row has no such column.
+bool TakeCount(size_t row, size_t cpu, const char **behind, uint64_t *count) {
+  if (cpu >= interrupts->cpus) return false;
+  const bool goesOn =
+      interrupts->nextCount != nullptr && row == interrupts->lastRow && cpu >= interrupts->nextCpu;
+  size_t column = goesOn ? interrupts->nextCpu : 0;
+  const char *place = goesOn ? interrupts->nextCount : interrupts->rows[row].counts;
+  for (; column <= cpu; ++column) {
+    place = SkipBlanks(place);
+    if (!TakeNumber(&place, count)) return false;
+  }
+  interrupts->lastRow = row;
+  interrupts->nextCpu = column;
+  interrupts->nextCount = place;
+  *behind = place;
+  return true;
+}
+
+// Whether a text is what stands before the devices: the controller's own number and the kind of
+// the interrupt, "5-edge", "27 Level" or "-event".
+bool IsSource(const char *text, size_t length) {
+  const char *end = text + length;
+  while (text < end && *text >= '0' && *text <= '9') ++text;
+  if (text < end && *text == '-') {
+    while (text < end && *text != ' ') ++text;
+  }
+  const auto rest = static_cast<size_t>(end - text);
+  return rest == 0 || (rest == 6 && memcmp(text, " Level", 6) == 0) ||
+         (rest == 5 && memcmp(text, " Edge", 5) == 0);
+}
+
+// The devices that use an interrupt, "i801_smbus, ahci", stand at the row's end, two blanks behind
+// the controller and its number. Both of these may have such gaps too.
+const char *FindDevices(size_t row, size_t *length) {
+  const char *start = interrupts->rows[row].counts;
+  uint64_t count;
+  *length = 0;
+  if (interrupts->cpus > 0 && !TakeCount(row, interrupts->cpus - 1, &start, &count)) return start;
+  start = SkipBlanks(start);
+  const char *end = start + strcspn(start, "\n");
+  while (end > start && end[-1] == ' ') --end;
+  const char *devices = end;
+  while (devices > start && !(devices[-1] == ' ' && devices - start > 1 && devices[-2] == ' ')) {
+    --devices;
+  }
+  const auto found = static_cast<size_t>(end - devices);
+  if (devices > start && !IsSource(devices, found)) *length = found;
+  return devices;
+}
+
+KIF_Status AddDevice(const char *name, size_t length, KIF_ParamList *list) {
+  char text[256];
+  CopyText(text, sizeof(text), name, length);
+  return KIF_ParamListAddString(list, text);
+}
+
+}  // namespace
+
+KIF_Status ListInterrupts(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
+  KIF_Status status = ReadInterrupts();
+  for (size_t i = 0; status == KIF_STATUS_OK && i < interrupts->rows.size(); ++i) {
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(interrupts->rows[i].number));
+  }
+  return status;
+}
+
+// The kernel's own interrupts have no number, so the users of all these have names.
+KIF_Status GetInterruptUsage(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  size_t row;
+  const KIF_Status status = FindRow(instance, &row);
+  if (status == KIF_STATUS_OK) static_cast<UsageRecord *>(record)->hasDevices = 1;
+  return status;
+}
+
+// PCPUs are numbered as the columns are: from 0, those online.
+KIF_Status GetInterruptCount(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  size_t row;
+  const KIF_Status status = FindRow(instance, &row);
+  if (status != KIF_STATUS_OK) return status;
+  int64_t cpu;
+  uint64_t count;
+  const char *behind;
+  if (!IntegerAt(instance, 1, &cpu) || cpu < 0 ||
+      !TakeCount(row, static_cast<size_t>(cpu), &behind, &count)) {
+    return KIF_STATUS_NOT_FOUND;
+  }
+  memcpy(record, &count, sizeof(count));
+  return KIF_STATUS_OK;
+}
+
+KIF_Status ListInterruptDevices(const NodeInfo &, const KIF_ParamList *parent,
+                                KIF_ParamList *list) {
+  static constexpr char kComma[] = ", ";
+  size_t row;
+  KIF_Status status = FindRow(parent, &row);
+  if (status != KIF_STATUS_OK) return status;
+  size_t length;
+  const char *name = FindDevices(row, &length);
+  const char *end = name + length;
+  while (status == KIF_STATUS_OK && name < end) {
+    const auto left = static_cast<size_t>(end - name);
+    const void *comma = memmem(name, left, kComma, sizeof(kComma) - 1);
+    const char *stop = comma != nullptr ? static_cast<const char *>(comma) : end;
+    status = AddDevice(name, static_cast<size_t>(stop - name), list);
+    name = comma != nullptr ? stop + sizeof(kComma) - 1 : end;
+  }
+  return status;
+}

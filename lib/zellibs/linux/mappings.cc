@@ -1,0 +1,160 @@
+// userworld_cartel_mem_mmaps: /proc/PID/maps.
+#include <fcntl.h>
+#include <stdio.h>
+
+#include <cstddef>
+#include <cstring>
+
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "linux/linux_nodes.h"
+
+namespace {
+
+struct __attribute__((packed)) MappingRecord {
+  unsigned char unused0[8];
+  uint32_t length;  // in bytes
+  unsigned char unused12[4];
+  uint32_t kind;
+  uint32_t protection;  // set of kReadable, kWritable
+  int32_t descriptor;
+  char description[2008];
+};
+static_assert(sizeof(MappingRecord) == 2036);
+static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
+              offsetof(MappingRecord, protection) == 20 &&
+              offsetof(MappingRecord, descriptor) == 24 &&
+              offsetof(MappingRecord, description) == 28);
+
+constexpr uint32_t kOther = 1;
+constexpr uint32_t kFile = 2;
+constexpr uint32_t kReadable = 0x1;
+constexpr uint32_t kWritable = 0x2;
+
+struct Mapping {
+  uint64_t start;
+  uint64_t end;
+  uint32_t protection;
+  const char *name;
+  size_t nameLength;
+};
+
+// The file of the process asked for last.
+struct KeptMaps {
+  int64_t process = -1;
+  Bytes text;
+  size_t next = 0;  // place of the line behind the one that was asked for last
+};
+
+Everlasting<KeptMaps> kept;
+
+KIF_Status ReadMaps(int64_t process) {
+  char path[32];
+  snprintf(path, sizeof(path), "/proc/%lld/maps", static_cast<long long>(process));
+  kept->process = -1;
+  kept->text.Clear();
+  kept->next = 0;
+  Descriptor file;
+  KIF_Status status = OpenHostFile(path, O_RDONLY, &file);
+  if (status == KIF_STATUS_OK) status = kept->text.ReadAll(file.fd());
+  if (status == KIF_STATUS_OK) kept->process = process;
+  return status;
+}
+
+int HexadecimalDigit(char digit) {
+  if (digit >= '0' && digit <= '9') return digit - '0';
+  return digit >= 'a' && digit <= 'f' ? digit - 'a' + 10 : -1;
+}
+
+// An address, and the character `end` behind it.
+bool TakeAddress(const char **text, char end, uint64_t *address) {
+  constexpr int kMostDigits = 16;
+  const char *place = *text;
+  *address = 0;
+  for (int digit; (digit = HexadecimalDigit(*place)) >= 0; ++place) {
+    *address = *address << 4 | static_cast<uint64_t>(digit);
+  }
+  if (place == *text || place - *text > kMostDigits || *place != end) return false;
+  *text = place + 1;
+  return true;
+}
+
+// See proc(5): "7f0000000000-7f0000001000 r--p 00000000 08:01 1234      /usr/lib/libc.so.6".
+bool ParseLine(const char *line, size_t length, Mapping *mapping) {
+  const char *place = line;
+  if (!TakeAddress(&place, '-', &mapping->start) || !TakeAddress(&place, ' ', &mapping->end) ||
+      mapping->end < mapping->start || strcspn(place, " \n") < 2) {
+    return false;
+  }
+  mapping->protection = (place[0] == 'r' ? kReadable : 0u) | (place[1] == 'w' ? kWritable : 0u);
+  for (int field = 0; field < 4; ++field) {
+    place += strcspn(place, " \n");
+    place += strspn(place, " ");
+  }
+  mapping->name = place;
+  mapping->nameLength = length - static_cast<size_t>(place - line);
+  return true;
+}
+
+// Takes the mapping at or behind `*place` in the text and moves `*place` behind its line. False at
+// the end.
+bool NextMapping(size_t *place, Mapping *mapping) {
+  const char *text = kept->text.text();
+  bool found = false;
+  while (!found && *place < kept->text.size()) {
+    const char *line = text + *place;
+    const size_t rest = kept->text.size() - *place;
+    const void *newline = memchr(line, '\n', rest);
+    const size_t length =
+        newline != nullptr ? static_cast<size_t>(static_cast<const char *>(newline) - line) : rest;
+    found = ParseLine(line, length, mapping);
+    *place += length + (newline != nullptr ? 1 : 0);
+  }
+  return found;
+}
+
+// Mappings are asked for in the order of their list, mostly.
+bool FindMapping(uint64_t start, Mapping *mapping) {
+  const size_t first = kept->next;
+  size_t place = first;
+  bool found = false;
+  while (!found && NextMapping(&place, mapping)) found = mapping->start == start;
+  if (!found) place = 0;
+  while (!found && place < first && NextMapping(&place, mapping)) found = mapping->start == start;
+  kept->next = place;
+  return found;
+}
+
+}  // namespace
+
+KIF_Status ListMappings(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
+  int64_t process;
+  if (!IntegerAt(parent, 0, &process)) return KIF_STATUS_BAD_PARAMETER;
+  KIF_Status status = ReadMaps(process);
+  Mapping mapping;
+  size_t place = 0;
+  while (status == KIF_STATUS_OK && NextMapping(&place, &mapping)) {
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(mapping.start));
+  }
+  return status;
+}
+
+KIF_Status GetMapping(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  auto *filled = static_cast<MappingRecord *>(record);
+  int64_t process;
+  int64_t start;
+  if (!IntegerAt(instance, 0, &process) || !IntegerAt(instance, 1, &start)) {
+    return KIF_STATUS_BAD_PARAMETER;
+  }
+  const KIF_Status status = process == kept->process ? KIF_STATUS_OK : ReadMaps(process);
+  if (status != KIF_STATUS_OK) return status;
+  Mapping mapping;
+  if (!FindMapping(static_cast<uint64_t>(start), &mapping)) return KIF_STATUS_NOT_FOUND;
+  const uint64_t length = mapping.end - mapping.start;
+  filled->length = length < UINT32_MAX ? static_cast<uint32_t>(length) : UINT32_MAX;
+  filled->kind = mapping.nameLength > 0 && mapping.name[0] == '/' ? kFile : kOther;
+  filled->protection = mapping.protection;
+  filled->descriptor = -1;
+  CopyText(filled->description, sizeof(filled->description), mapping.name, mapping.nameLength);
+  return KIF_STATUS_OK;
+}

@@ -1,0 +1,182 @@
+// system_modules: the loaded modules in the order of /proc/modules, then the drivers built into the
+// kernel that own a PCI function, by name. A module's number is its place in this list, from 1.
+#include "linux/modules.h"
+
+#include <fcntl.h>
+
+#include <cstddef>
+#include <cstdio>
+#include <cstring>
+
+#include "linux/array.h"
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "linux/linux_nodes.h"
+
+namespace {
+
+struct __attribute__((packed)) ModuleRecord {
+  char name[288];
+  uint32_t moduleID;
+  uint8_t unused292[408];
+};
+static_assert(sizeof(ModuleRecord) == 700);
+static_assert(offsetof(ModuleRecord, moduleID) == 288);
+
+struct Module {
+  char name[64];
+};
+
+// The list, as it was when it was last asked for.
+struct ModuleTable {
+  bool read = false;
+  Array<Module> modules;
+  size_t loaded = 0;  // so many of them are loaded, the others built in
+};
+
+Everlasting<ModuleTable> table;
+
+KIF_Status AddModule(const char *name, size_t length) {
+  Module module = {};
+  CopyText(module.name, sizeof(module.name), name, length);
+  return table->modules.Append(module) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+}
+
+// proc(5), /proc/modules: a line each, which begins with the name.
+KIF_Status AddLoadedModules() {
+  Descriptor file;
+  Bytes lines;
+  KIF_Status status = OpenHostFile("/proc/modules", O_RDONLY, &file);
+  if (status == KIF_STATUS_OK) status = lines.ReadAll(file.fd());
+  const char *line = lines.text();
+  while (status == KIF_STATUS_OK && *line != '\0') {
+    const size_t name = strcspn(line, " \n");
+    if (name > 0) status = AddModule(line, name);
+    line += strcspn(line, "\n");
+    if (*line == '\n') ++line;
+  }
+  table->loaded = table->modules.size();
+  return status;
+}
+
+// Place of a loaded module plus 1, or 0. Drivers write '-' where modules have '_'.
+uint32_t FindLoaded(const char *name) {
+  for (uint32_t i = 0; i < table->loaded; ++i) {
+    const char *module = table->modules[i].name;
+    size_t k = 0;
+    while (name[k] != '\0' && (name[k] == module[k] || (name[k] == '-' && module[k] == '_'))) ++k;
+    if (name[k] == module[k]) return i + 1;
+  }
+  return 0;
+}
+
+uint32_t FindBuiltIn(const char *name) {
+  for (size_t i = table->loaded; i < table->modules.size(); ++i) {
+    if (strcmp(table->modules[i].name, name) == 0) return static_cast<uint32_t>(i + 1);
+  }
+  return 0;
+}
+
+uint32_t FindInTable(const PciDriver &driver) {
+  if (driver.name[0] == '\0') return 0;
+  uint32_t number = driver.module[0] != '\0' ? FindLoaded(driver.module) : 0;
+  if (number == 0) number = FindLoaded(driver.name);
+  return number != 0 ? number : FindBuiltIn(driver.name);
+}
+
+int CompareModules(const void *left, const void *right) {
+  return strcmp(static_cast<const Module *>(left)->name, static_cast<const Module *>(right)->name);
+}
+
+KIF_Status AddBuiltInDrivers() {
+  DirectoryReader devices;
+  KIF_Status status = devices.Open("/sys/bus/pci/devices");
+  while (status == KIF_STATUS_OK) {
+    const char *address = devices.Next();
+    if (address == nullptr) {
+      status = devices.status();
+      break;
+    }
+    PciDriver driver;
+    ReadPciDriver(devices.fd(), address, &driver);
+    if (driver.name[0] != '\0' && FindInTable(driver) == 0) {
+      status = AddModule(driver.name, strlen(driver.name));
+    }
+  }
+  const size_t builtIn = table->modules.size() - table->loaded;
+  if (builtIn > 0) {
+    qsort(table->modules.begin() + table->loaded, builtIn, sizeof(Module), CompareModules);
+  }
+  return status;
+}
+
+// A kernel may do without modules or without a PCI bus, but where neither is seen there is no list.
+KIF_Status ReadModules() {
+  table->read = false;
+  table->modules.Clear();
+  table->loaded = 0;
+  KIF_Status status = AddLoadedModules();
+  const bool hasModules = status == KIF_STATUS_OK;
+  if (status == KIF_STATUS_OK || status == KIF_STATUS_NOT_FOUND) status = AddBuiltInDrivers();
+  if (status == KIF_STATUS_NOT_FOUND && hasModules) status = KIF_STATUS_OK;
+  table->read = status == KIF_STATUS_OK;
+  return status;
+}
+
+KIF_Status NeedModules() {
+  return table->read ? KIF_STATUS_OK : ReadModules();
+}
+
+// The last component of a link's target, printable; empty where there is no such link.
+template <size_t Size>
+void ReadLinkName(int directory, const char *path, char (&name)[Size]) {
+  char target[1024];
+  name[0] = '\0';
+  if (ReadLinkBelow(directory, path, target, sizeof(target)) != KIF_STATUS_OK) return;
+  const char *slash = strrchr(target, '/');
+  const char *last = slash != nullptr ? slash + 1 : target;
+  CopyText(name, Size, last, strlen(last));
+}
+
+}  // namespace
+
+void ReadPciDriver(int devices, const char *address, PciDriver *driver) {
+  char path[300];
+  snprintf(path, sizeof(path), "%s/driver", address);
+  ReadLinkName(devices, path, driver->name);
+  driver->module[0] = '\0';
+  if (driver->name[0] == '\0') return;
+  snprintf(path, sizeof(path), "%s/driver/module", address);
+  ReadLinkName(devices, path, driver->module);
+}
+
+KIF_Status FindModule(const PciDriver &driver, uint32_t *number) {
+  *number = 0;
+  if (driver.name[0] == '\0') return KIF_STATUS_OK;
+  const KIF_Status status = NeedModules();
+  if (status == KIF_STATUS_OK) *number = FindInTable(driver);
+  return status;
+}
+
+KIF_Status ListModuleNumbers(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
+  KIF_Status status = ReadModules();
+  for (uint32_t i = 0; status == KIF_STATUS_OK && i < table->modules.size(); ++i) {
+    status = KIF_ParamListAddInt(list, i + 1);
+  }
+  return status;
+}
+
+KIF_Status GetModule(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const KIF_Status status = NeedModules();
+  if (status != KIF_STATUS_OK) return status;
+  int64_t number;
+  if (!IntegerAt(instance, 0, &number) || number < 1 ||
+      static_cast<uint64_t>(number) > table->modules.size()) {
+    return KIF_STATUS_NOT_FOUND;
+  }
+  auto *module = static_cast<ModuleRecord *>(record);
+  const Module &known = table->modules[static_cast<size_t>(number) - 1];
+  memcpy(module->name, known.name, sizeof(known.name));
+  module->moduleID = static_cast<uint32_t>(number);
+  return KIF_STATUS_OK;
+}

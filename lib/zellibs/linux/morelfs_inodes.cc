@@ -1,0 +1,332 @@
+// system_morelfs_inodes: the files of the volumes in memory, found by a walk, and the deleted ones
+// that processes still hold open.
+#include <fcntl.h>
+#include <limits.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+
+#include <cstddef>
+#include <cstdio>
+#include <cstring>
+
+#include "linux/array.h"
+#include "linux/everlasting.h"
+#include "linux/linux_nodes.h"
+#include "linux/volumes.h"
+
+namespace {
+
+constexpr uint32_t kOnTardisk = 0x1;
+constexpr int32_t kUnlinked = -4;
+
+struct __attribute__((packed)) InodeRecord {
+  uint8_t unused0[4];
+  uint32_t flags;
+  uint8_t unused8[12];
+  int32_t linkState;
+  uint8_t unused24[4];
+  uint32_t size;  // bytes
+  char tardisk[128];
+  char ramdisk[128];
+  char name[256];
+};
+static_assert(sizeof(InodeRecord) == 544);
+static_assert(offsetof(InodeRecord, flags) == 4);
+static_assert(offsetof(InodeRecord, linkState) == 20);
+static_assert(offsetof(InodeRecord, size) == 28);
+static_assert(offsetof(InodeRecord, tardisk) == 32);
+static_assert(offsetof(InodeRecord, ramdisk) == 160);
+static_assert(offsetof(InodeRecord, name) == 288);
+
+constexpr size_t kNameSize = sizeof(InodeRecord::name);
+
+struct Inode {
+  uint64_t number;  // the file system's; what several volumes number alike is told apart on top
+  uint32_t major;
+  uint32_t minor;
+  uint32_t volume;  // place in the volumes
+  uint32_t size;
+  bool deleted;
+  size_t path;  // place in the paths
+};
+
+struct VolumeName {
+  bool isTardisk;
+  char name[sizeof(Volume::name)];
+};
+
+// The files as they were at the last walk, by number.
+struct InodeTable {
+  bool read = false;
+  Array<Inode> inodes;
+  Bytes paths;  // terminated texts
+  Array<VolumeName> volumes;
+};
+
+Everlasting<InodeTable> table;
+
+// A walk under way.
+struct Walk {
+  const VolumeTable *volumes;
+  Bytes pending;  // folders still to be read, terminated paths below the volume's top folder
+};
+
+bool IsOnVolume(const struct stat &facts, const Mount &mount) {
+  return major(facts.st_dev) == mount.major && minor(facts.st_dev) == mount.minor;
+}
+
+KIF_Status AddInode(uint32_t volume, const struct stat &facts, const char *path, bool deleted) {
+  char printed[kNameSize];
+  CopyText(printed, sizeof(printed), path, strlen(path));
+  const uint64_t size = facts.st_size > 0 ? static_cast<uint64_t>(facts.st_size) : 0;
+  const Inode inode = {facts.st_ino,
+                       major(facts.st_dev),
+                       minor(facts.st_dev),
+                       volume,
+                       size < UINT32_MAX ? static_cast<uint32_t>(size) : UINT32_MAX,
+                       deleted,
+                       table->paths.size()};
+  const bool added =
+      table->inodes.Append(inode) && table->paths.Append(printed, strlen(printed) + 1);
+  return added ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+}
+
+bool HasMountsBelow(const MountTable &mounts, const Mount &mount) {
+  for (const Mount &other : mounts.mounts) {
+    if (other.parent == mount.id && &other != &mount) return true;
+  }
+  return false;
+}
+
+// Looking at a mount point looks at what is mounted there, and that may not answer.
+bool IsMountPoint(const MountTable &mounts, const Mount &mount, const char *path) {
+  for (const Mount &other : mounts.mounts) {
+    if (other.parent == mount.id && strcmp(other.point, path) == 0) return true;
+  }
+  return false;
+}
+
+// Removes the folder that was put off last and copies its path.
+bool TakePending(Bytes *pending, char (&path)[PATH_MAX]) {
+  if (pending->size() == 0) return false;
+  const char *texts = pending->data();
+  size_t start = pending->size() - 1;
+  while (start > 0 && texts[start - 1] != '\0') --start;
+  snprintf(path, sizeof(path), "%s", texts + start);
+  pending->Truncate(start);
+  return true;
+}
+
+// Adds the files in one folder of a volume, and puts its folders off. What changes under the walk
+// or is closed to the reader is passed over.
+KIF_Status WalkFolder(Walk *walk, uint32_t place, int top, bool watchMounts,
+                      const char (&folder)[PATH_MAX]) {
+  const MountTable &mounts = walk->volumes->mounts;
+  const Mount &mount = *walk->volumes->volumes[place].mount;
+  DirectoryReader reader;
+  struct stat facts;
+  if (reader.OpenBelow(top, folder[0] != '\0' ? folder : ".") != KIF_STATUS_OK ||
+      fstat(reader.fd(), &facts) != 0 || !IsOnVolume(facts, mount)) {
+    return KIF_STATUS_OK;
+  }
+  const char *point = strcmp(mount.point, "/") == 0 ? "" : mount.point;
+  KIF_Status status = KIF_STATUS_OK;
+  while (status == KIF_STATUS_OK) {
+    const char *name = reader.Next();
+    if (name == nullptr) break;
+    char path[PATH_MAX];
+    char full[2 * PATH_MAX];
+    const char *slash = folder[0] != '\0' ? "/" : "";
+    const int length = snprintf(path, sizeof(path), "%s%s%s", folder, slash, name);
+    if (length < 0 || static_cast<size_t>(length) >= sizeof(path)) continue;
+    snprintf(full, sizeof(full), "%s/%s", point, path);
+    if (watchMounts && IsMountPoint(mounts, mount, full)) continue;
+    constexpr int kFlags = AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT;
+    if (fstatat(reader.fd(), name, &facts, kFlags) != 0 || !IsOnVolume(facts, mount)) continue;
+    status = AddInode(place, facts, full, false);
+    const bool goesOn = status == KIF_STATUS_OK && S_ISDIR(facts.st_mode);
+    if (goesOn && !walk->pending.Append(path, strlen(path) + 1)) status = KIF_STATUS_NO_MEMORY;
+  }
+  return status;
+}
+
+// Whether the same files were seen below another point already.
+bool WasWalked(const VolumeTable &volumes, uint32_t place) {
+  const Mount &mount = *volumes.volumes[place].mount;
+  for (uint32_t i = 0; i < place; ++i) {
+    const Mount &other = *volumes.volumes[i].mount;
+    if (other.major == mount.major && other.minor == mount.minor &&
+        strcmp(other.root, mount.root) == 0) {
+      return true;
+    }
+  }
+  return false;
+}
+
+KIF_Status WalkVolume(Walk *walk, uint32_t place) {
+  const Volume &volume = walk->volumes->volumes[place];
+  Descriptor top;
+  struct stat facts;
+  if (WasWalked(*walk->volumes, place) || OpenVolume(volume, &top) != KIF_STATUS_OK ||
+      fstat(top.fd(), &facts) != 0 || !IsOnVolume(facts, *volume.mount)) {
+    return KIF_STATUS_OK;
+  }
+  KIF_Status status = AddInode(place, facts, volume.mount->point, false);
+  const bool watchMounts = HasMountsBelow(walk->volumes->mounts, *volume.mount);
+  char folder[PATH_MAX] = "";
+  while (status == KIF_STATUS_OK) {
+    status = WalkFolder(walk, place, top.fd(), watchMounts, folder);
+    if (!TakePending(&walk->pending, folder)) break;
+  }
+  return status;
+}
+
+bool FindVolumeOf(const VolumeTable &volumes, const struct stat &facts, uint32_t *place) {
+  for (uint32_t i = 0; i < volumes.volumes.size(); ++i) {
+    *place = i;
+    if (IsOnVolume(facts, *volumes.volumes[i].mount)) return true;
+  }
+  return false;
+}
+
+// Adds the file behind a descriptor where its link says that it was deleted.
+KIF_Status AddIfDeleted(const VolumeTable &volumes, int descriptors, const char *name) {
+  static constexpr char kDeleted[] = " (deleted)";
+  constexpr size_t kDeletedLength = sizeof(kDeleted) - 1;
+  char target[PATH_MAX + kDeletedLength];
+  size_t length;
+  if (ReadLinkBelow(descriptors, name, target, sizeof(target), &length) != KIF_STATUS_OK ||
+      length <= kDeletedLength || strcmp(target + length - kDeletedLength, kDeleted) != 0) {
+    return KIF_STATUS_OK;
+  }
+  struct stat facts;
+  uint32_t place;
+  if (fstatat(descriptors, name, &facts, AT_NO_AUTOMOUNT) != 0 || facts.st_nlink != 0 ||
+      !FindVolumeOf(volumes, facts, &place)) {
+    return KIF_STATUS_OK;
+  }
+  target[length - kDeletedLength] = '\0';
+  return AddInode(place, facts, target, true);
+}
+
+// The processes of others are closed to an unprivileged reader.
+KIF_Status WalkProcesses(const VolumeTable &volumes) {
+  DirectoryReader processes;
+  KIF_Status status = processes.Open("/proc");
+  while (status == KIF_STATUS_OK) {
+    const char *process = processes.Next();
+    if (process == nullptr) return processes.status();
+    if (process[0] < '1' || process[0] > '9') continue;
+    char path[300];
+    snprintf(path, sizeof(path), "%s/fd", process);
+    DirectoryReader descriptors;
+    if (descriptors.OpenBelow(processes.fd(), path) != KIF_STATUS_OK) continue;
+    while (status == KIF_STATUS_OK) {
+      const char *name = descriptors.Next();
+      if (name == nullptr) break;
+      status = AddIfDeleted(volumes, descriptors.fd(), name);
+    }
+  }
+  return status;
+}
+
+int CompareNumbers(const void *left, const void *right) {
+  const auto *a = static_cast<const Inode *>(left);
+  const auto *b = static_cast<const Inode *>(right);
+  return a->number < b->number ? -1 : a->number > b->number;
+}
+
+bool IsSameFile(const Inode &a, const Inode &b) {
+  return a.number == b.number && a.major == b.major && a.minor == b.minor;
+}
+
+// Device 1 is the root in memory: its files keep their numbers. Then the volumes in their order.
+int CompareFiles(const void *left, const void *right) {
+  const auto *a = static_cast<const Inode *>(left);
+  const auto *b = static_cast<const Inode *>(right);
+  if (a->number != b->number) return CompareNumbers(left, right);
+  const bool aFirst = a->major == 0 && a->minor == 1;
+  const bool bFirst = b->major == 0 && b->minor == 1;
+  if (aFirst != bFirst) return aFirst ? -1 : 1;
+  if (a->volume != b->volume) return a->volume < b->volume ? -1 : 1;
+  return a->path < b->path ? -1 : a->path > b->path;
+}
+
+// Leaves each file once, and each number to one file.
+void NumberInodes(Array<Inode> *inodes) {
+  constexpr int kVolumeShift = 48;
+  if (inodes->size() == 0) return;
+  qsort(inodes->begin(), inodes->size(), sizeof(Inode), CompareFiles);
+  Inode previous = {};
+  size_t kept = 0;
+  for (size_t i = 0; i < inodes->size(); ++i) {
+    Inode inode = (*inodes)[i];
+    const bool isFirst = i == 0 || inode.number != previous.number;
+    if (!isFirst && IsSameFile(inode, previous)) continue;
+    previous = inode;
+    if (!isFirst) inode.number |= (uint64_t{inode.volume} + 1) << kVolumeShift;
+    (*inodes)[kept++] = inode;
+  }
+  inodes->Truncate(kept);
+  qsort(inodes->begin(), inodes->size(), sizeof(Inode), CompareNumbers);
+}
+
+// The volumes may be read anew while the files are not.
+KIF_Status KeepVolumeNames(const VolumeTable &volumes) {
+  for (const Volume &volume : volumes.volumes) {
+    VolumeName name = {volume.isTardisk, ""};
+    memcpy(name.name, volume.name, sizeof(name.name));
+    if (!table->volumes.Append(name)) return KIF_STATUS_NO_MEMORY;
+  }
+  return KIF_STATUS_OK;
+}
+
+KIF_Status ReadInodes() {
+  table->read = false;
+  table->inodes.Clear();
+  table->paths.Clear();
+  table->volumes.Clear();
+  if (IsForeignRoot()) return KIF_STATUS_NOT_FOUND;
+  Walk walk;
+  KIF_Status status = NeedVolumes(true, &walk.volumes);
+  if (status == KIF_STATUS_OK) status = KeepVolumeNames(*walk.volumes);
+  if (status != KIF_STATUS_OK) return status;
+  for (uint32_t i = 0; status == KIF_STATUS_OK && i < walk.volumes->volumes.size(); ++i) {
+    status = WalkVolume(&walk, i);
+  }
+  if (status == KIF_STATUS_OK) status = WalkProcesses(*walk.volumes);
+  if (status != KIF_STATUS_OK) return status;
+  NumberInodes(&table->inodes);
+  table->read = true;
+  return KIF_STATUS_OK;
+}
+
+}  // namespace
+
+KIF_Status ListInodes(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
+  KIF_Status status = ReadInodes();
+  for (size_t i = 0; status == KIF_STATUS_OK && i < table->inodes.size(); ++i) {
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(table->inodes[i].number));
+  }
+  return status;
+}
+
+KIF_Status GetInode(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const KIF_Status status = table->read ? KIF_STATUS_OK : ReadInodes();
+  if (status != KIF_STATUS_OK) return status;
+  int64_t number;
+  if (table->inodes.size() == 0 || !IntegerAt(instance, 0, &number)) return KIF_STATUS_NOT_FOUND;
+  Inode wanted = {};
+  wanted.number = static_cast<uint64_t>(number);
+  const auto *inode = static_cast<const Inode *>(
+      bsearch(&wanted, table->inodes.begin(), table->inodes.size(), sizeof(Inode), CompareNumbers));
+  if (inode == nullptr) return KIF_STATUS_NOT_FOUND;
+  const VolumeName &volume = table->volumes[inode->volume];
+  auto *stats = static_cast<InodeRecord *>(record);
+  stats->flags = volume.isTardisk ? kOnTardisk : 0;
+  stats->linkState = inode->deleted ? kUnlinked : 0;
+  stats->size = inode->size;
+  memcpy(volume.isTardisk ? stats->tardisk : stats->ramdisk, volume.name, sizeof(volume.name));
+  snprintf(stats->name, sizeof(stats->name), "%s", table->paths.text() + inode->path);
+  return KIF_STATUS_OK;
+}

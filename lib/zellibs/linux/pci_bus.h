@@ -1,0 +1,31 @@
+// The functions on the PCI bus, and finding one of them.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "linux/files.h"
+#include "param_list.h"
+
+struct PciAddress {
+  uint32_t part[4];  // segment, bus, slot and function
+};
+
+// A function and its folder in /sys/bus/pci/devices.
+struct PciFunction {
+  PciAddress address;
+  char name[32];  // "0000:00:1f.2"
+  Descriptor devices;
+  Descriptor folder;
+};
+
+// Opens the function that `instance` selects.
+KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciFunction *function);
+
+// Number of the slot in the machine's case that holds the function; -1: none is known. The status
+// is that of reading the bus.
+KIF_Status FindPhysicalSlot(const PciAddress &address, int32_t *number);
+
+// Converts the hexadecimal number that `*text` begins with, moves `*text` behind it and behind the
+// character `end` that must follow. False where there is no such number.
+bool TakeHex(const char **text, char end, uint32_t *number);

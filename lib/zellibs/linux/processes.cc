@@ -1,0 +1,576 @@
+#include "linux/processes.h"
+
+#include <fcntl.h>
+#include <sched.h>
+#include <stdio.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include "linux/array.h"
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "linux/userspaces.h"
+#include "status.h"
+
+namespace {
+
+// How much the picture shows; each level includes the ones before it.
+enum class Level : uint8_t { kNothing, kCartels, kProcesses, kThreads };
+
+struct ThreadPlace {
+  int32_t id;
+  uint32_t place;
+};
+
+struct ChildPlace {
+  int32_t parent;
+  uint32_t place;
+};
+
+// A pathname below /proc: "PID/task/TID/" and the longest file name used here.
+constexpr size_t kPathSize = 64;
+
+// Long enough for the fields up to num_threads, with any name.
+constexpr size_t kStatSize = 1024;
+
+// One more byte than is kept tells a command line that was cut from one that just fits.
+constexpr size_t kCommandLineRead = kCommandLineSize + 4;
+
+constexpr unsigned long kKernelThreadFlag = 0x00200000;  // PF_KTHREAD, include/linux/sched.h
+
+struct Stat {
+  char state;
+  int32_t parent;
+  int32_t group;
+  int32_t session;
+  uint64_t flags;
+  uint64_t cpuTicks;
+  uint32_t threads;
+  char name[kThreadNameSize];
+};
+
+struct Picture {
+  Level level = Level::kNothing;
+  Descriptor proc;
+  Array<Process> processes;    // by ID
+  Array<Thread> threads;       // as they are listed
+  Array<ThreadPlace> byId;     // the threads by ID; made when it is needed
+  Array<ChildPlace> byParent;  // the processes by parent, then ID; made when it is needed
+  Bytes commandLines;          // each terminated
+  uint32_t nextThread = 0;     // where the next thread asked for is likely to stand
+  uint32_t nextProcess = 0;
+};
+
+Everlasting<Picture> picture;
+
+// The command line read last, for the threads of a process that are asked for in a row.
+struct LastCommandLine {
+  int64_t process;
+  bool current;
+  KIF_Status status;
+  char text[kCommandLineSize];
+};
+
+LastCommandLine lastCommandLine;
+
+bool TakeSigned(const char **text, int32_t *value) {
+  while (**text == ' ') ++*text;
+  const bool negative = **text == '-';
+  if (negative) ++*text;
+  uint64_t number;
+  if (!TakeNumber(text, &number)) return false;
+  *value = negative ? -static_cast<int32_t>(number) : static_cast<int32_t>(number);
+  return true;
+}
+
+bool TakeUnsigned(const char **text, uint64_t *value) {
+  while (**text == ' ') ++*text;
+  if (**text == '-') ++*text;
+  return TakeNumber(text, value);
+}
+
+// See proc(5), /proc/pid/stat. The name may hold anything, ')' and blanks too.
+bool ParseStat(const char *text, size_t length, Stat *stat) {
+  const char *open = static_cast<const char *>(memchr(text, '(', length));
+  const char *close = static_cast<const char *>(memrchr(text, ')', length));
+  if (open == nullptr || close == nullptr || close < open || close[1] != ' ') return false;
+  CopyText(stat->name, sizeof(stat->name), open + 1, static_cast<size_t>(close - open - 1));
+  const char *place = close + 2;
+  stat->state = *place;
+  if (stat->state == '\0') return false;
+  ++place;
+  uint64_t skipped;
+  uint64_t userTicks;
+  uint64_t systemTicks;
+  uint64_t threads;
+  bool good = TakeSigned(&place, &stat->parent) && TakeSigned(&place, &stat->group) &&
+              TakeSigned(&place, &stat->session) && TakeUnsigned(&place, &skipped) &&
+              TakeUnsigned(&place, &skipped) && TakeUnsigned(&place, &stat->flags);
+  for (int field = 10; good && field <= 13; ++field) good = TakeUnsigned(&place, &skipped);
+  good = good && TakeUnsigned(&place, &userTicks) && TakeUnsigned(&place, &systemTicks);
+  for (int field = 16; good && field <= 19; ++field) good = TakeUnsigned(&place, &skipped);
+  if (!good || !TakeUnsigned(&place, &threads)) return false;
+  stat->cpuTicks = userTicks + systemTicks;
+  stat->threads = static_cast<uint32_t>(threads);
+  return true;
+}
+
+KIF_Status ReadStat(int directory, const char *path, Stat *stat) {
+  char text[kStatSize];
+  size_t length;
+  const KIF_Status status = ReadBelow(directory, path, text, sizeof(text), &length);
+  if (status != KIF_STATUS_OK) return status;
+  return ParseStat(text, length, stat) ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
+}
+
+// The main thread's own file: that of the process adds up all its threads.
+KIF_Status ReadThreadStat(int32_t process, int32_t thread, Stat *stat) {
+  char path[kPathSize];
+  snprintf(path, sizeof(path), "%d/task/%d/stat", process, thread);
+  const KIF_Status status = ReadStat(picture->proc.fd(), path, stat);
+  if (status != KIF_STATUS_NOT_FOUND || !IsForeignRoot() || process != thread) return status;
+  snprintf(path, sizeof(path), "%d/stat", process);  // a tree written by hand may hold no tasks
+  return ReadStat(picture->proc.fd(), path, stat);
+}
+
+bool IsDead(char state) {
+  return state == 'Z' || state == 'X' || state == 'x';
+}
+
+void FillProcess(const Stat &stat, Process *process) {
+  process->hasStat = true;
+  process->parent = stat.parent;
+  process->group = stat.group;
+  process->session = stat.session;
+  process->threads = stat.threads;
+  process->isKernel = (stat.flags & kKernelThreadFlag) != 0;
+  process->isZombie = IsDead(stat.state);
+}
+
+void FillThread(const Stat &stat, Thread *thread) {
+  thread->state = stat.state;
+  thread->served = 0;
+  thread->cpuTicks = stat.cpuTicks;
+  memcpy(thread->name, stat.name, sizeof(thread->name));
+}
+
+KIF_Status AppendThread(uint32_t process, int32_t id, const Stat &stat) {
+  Thread thread = {};
+  thread.id = id;
+  thread.process = process;
+  FillThread(stat, &thread);
+  return picture->threads.Append(thread) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+}
+
+// A directory of numbers, ascending; other names are passed over.
+KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers) {
+  bool sorted = true;
+  while (const char *name = directory->Next()) {
+    const char *place = name;
+    uint64_t number;
+    if (!TakeNumber(&place, &number) || *place != '\0' || number == 0 || number > INT32_MAX) {
+      continue;
+    }
+    const auto id = static_cast<int32_t>(number);
+    sorted = sorted && (numbers->size() == 0 || (*numbers)[numbers->size() - 1] < id);
+    if (!numbers->Append(id)) return KIF_STATUS_NO_MEMORY;
+  }
+  if (!sorted) std::sort(numbers->begin(), numbers->end());
+  return directory->status();
+}
+
+// Begins a new picture: nothing in it but /proc, open, and its processes' IDs in `ids`.
+KIF_Status BeginPicture(Array<int32_t> *ids) {
+  picture->level = Level::kNothing;
+  picture->processes.Clear();
+  picture->threads.Clear();
+  picture->byId.Clear();
+  picture->byParent.Clear();
+  picture->nextThread = picture->nextProcess = 0;
+  lastCommandLine.current = false;
+  DirectoryReader proc;
+  KIF_Status status = proc.Open("/proc");
+  if (status != KIF_STATUS_OK) return status;
+  status = ListNumbers(&proc, ids);
+  if (status != KIF_STATUS_OK) return status;
+  return OpenBelow(proc.fd(), ".", O_PATH | O_DIRECTORY, &picture->proc);
+}
+
+Process NewProcess(int32_t id) {
+  Process process = {};
+  process.id = id;
+  process.mainThread = kNoThread;
+  process.commandLine = kNoCommandLine;
+  return process;
+}
+
+KIF_Status AppendOtherThreads(uint32_t place) {
+  const int32_t id = picture->processes[place].id;
+  char path[kPathSize];
+  snprintf(path, sizeof(path), "%d/task", id);
+  DirectoryReader tasks;
+  if (tasks.OpenBelow(picture->proc.fd(), path) != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
+  Array<int32_t> ids;
+  const KIF_Status listed = ListNumbers(&tasks, &ids);
+  if (listed == KIF_STATUS_NO_MEMORY) return listed;
+  for (const int32_t thread : ids) {
+    if (thread == id) continue;
+    Stat stat;
+    snprintf(path, sizeof(path), "%d/stat", thread);
+    if (ReadStat(tasks.fd(), path, &stat) != KIF_STATUS_OK || IsDead(stat.state)) continue;
+    const KIF_Status status = AppendThread(place, thread, stat);
+    if (status != KIF_STATUS_OK) return status;
+  }
+  return KIF_STATUS_OK;
+}
+
+KIF_Status AppendProcess(int32_t id, bool withThreads) {
+  Process process = NewProcess(id);
+  Stat stat;
+  const KIF_Status read = ReadThreadStat(id, id, &stat);
+  if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
+  if (read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone, or not for this reader
+  FillProcess(stat, &process);
+  const auto place = static_cast<uint32_t>(picture->processes.size());
+  if (!process.isZombie) {
+    process.mainThread = static_cast<uint32_t>(picture->threads.size());
+    const KIF_Status status = AppendThread(place, id, stat);
+    if (status != KIF_STATUS_OK) return status;
+  }
+  if (!picture->processes.Append(process)) return KIF_STATUS_NO_MEMORY;
+  // A foreign tree need not agree with what the kernel once counted.
+  const bool hasOthers = stat.threads > 1 || IsForeignRoot();
+  return withThreads && hasOthers ? AppendOtherThreads(place) : KIF_STATUS_OK;
+}
+
+// The command lines that were read while the cartels were listed serve the new picture too.
+void KeepCommandLines(const Array<Process> &before) {
+  const Process *old = before.begin();
+  for (Process &process : picture->processes) {
+    while (old != before.end() && old->id < process.id) ++old;
+    if (old != before.end() && old->id == process.id) process.commandLine = old->commandLine;
+  }
+}
+
+KIF_Status TakePicture(Level level) {
+  Array<Process> before;
+  if (picture->level == Level::kCartels) before.Swap(picture->processes);
+  Array<int32_t> ids;
+  KIF_Status status = BeginPicture(&ids);
+  for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) {
+    status = AppendProcess(ids[i], level == Level::kThreads);
+  }
+  if (status != KIF_STATUS_OK) return status;
+  KeepCommandLines(before);
+  status =
+      AssignUserspaces(picture->proc.fd(), picture->processes.begin(), picture->processes.size());
+  if (status == KIF_STATUS_OK) picture->level = level;
+  return status;
+}
+
+KIF_Status NeedLevel(Level level) {
+  return picture->level >= level ? KIF_STATUS_OK : TakePicture(level);
+}
+
+Process *FindProcess(int64_t id) {
+  const uint32_t next = picture->nextProcess;
+  Process *found = nullptr;
+  if (next < picture->processes.size() && picture->processes[next].id == id) {
+    found = &picture->processes[next];
+  } else {
+    Process *place = std::lower_bound(
+        picture->processes.begin(), picture->processes.end(), id,
+        [](const Process &process, int64_t wanted) { return process.id < wanted; });
+    if (place != picture->processes.end() && place->id == id) found = place;
+  }
+  if (found != nullptr) {
+    picture->nextProcess = static_cast<uint32_t>(found - picture->processes.begin()) + 1;
+  }
+  return found;
+}
+
+// Sorts the threads' places by ID, once for each picture that is asked out of order.
+KIF_Status IndexThreads() {
+  if (picture->byId.size() == picture->threads.size()) return KIF_STATUS_OK;
+  picture->byId.Clear();
+  for (uint32_t i = 0; i < picture->threads.size(); ++i) {
+    if (!picture->byId.Append({picture->threads[i].id, i})) return KIF_STATUS_NO_MEMORY;
+  }
+  std::sort(picture->byId.begin(), picture->byId.end(),
+            [](const ThreadPlace &a, const ThreadPlace &b) { return a.id < b.id; });
+  return KIF_STATUS_OK;
+}
+
+KIF_Status PlaceOfThread(int64_t id, uint32_t *found) {
+  // Readers ask for a thread's values in a row, and for the threads in the order of the list.
+  for (const uint32_t step : {0u, 1u}) {
+    const uint32_t place = picture->nextThread + step;
+    if (place < picture->threads.size() && picture->threads[place].id == id) {
+      *found = picture->nextThread = place;
+      return KIF_STATUS_OK;
+    }
+  }
+  const KIF_Status status = IndexThreads();
+  if (status != KIF_STATUS_OK) return status;
+  const ThreadPlace *place = std::lower_bound(
+      picture->byId.begin(), picture->byId.end(), id,
+      [](const ThreadPlace &thread, int64_t wanted) { return thread.id < wanted; });
+  if (place == picture->byId.end() || place->id != id) return KIF_STATUS_NOT_FOUND;
+  *found = picture->nextThread = place->place;
+  return KIF_STATUS_OK;
+}
+
+// In a picture of cartels only, a process is read when it is asked for.
+KIF_Status ReadMainThread(Process *process) {
+  if (process->mainThread != kNoThread) return KIF_STATUS_OK;
+  Stat stat;
+  const KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
+  if (status != KIF_STATUS_OK) return status;
+  if (IsDead(stat.state)) return KIF_STATUS_NOT_FOUND;
+  FillProcess(stat, process);
+  process->mainThread = static_cast<uint32_t>(picture->threads.size());
+  return AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
+                      stat);
+}
+
+KIF_Status RefreshThread(Thread *thread) {
+  Stat stat;
+  const int32_t process = picture->processes[thread->process].id;
+  const KIF_Status status = ReadThreadStat(process, thread->id, &stat);
+  if (status != KIF_STATUS_OK) return status;
+  if (IsDead(stat.state)) return KIF_STATUS_NOT_FOUND;
+  FillThread(stat, thread);
+  return KIF_STATUS_OK;
+}
+
+// Finds the thread in the picture, or in one of more detail where this one cannot have it.
+KIF_Status LookUpThread(int64_t id, ThreadValue value, uint32_t *place) {
+  if (picture->level == Level::kCartels) {
+    Process *process = FindProcess(id);
+    if (process != nullptr && value != ThreadValue::kInfo) {
+      const KIF_Status status = ReadMainThread(process);
+      *place = process->mainThread;
+      return status;
+    }
+    const KIF_Status status = TakePicture(process != nullptr ? Level::kProcesses : Level::kThreads);
+    if (status != KIF_STATUS_OK) return status;
+  }
+  if (picture->level == Level::kProcesses && FindProcess(id) == nullptr) {
+    picture->level = Level::kNothing;
+  }
+  const KIF_Status status =
+      NeedLevel(picture->level == Level::kNothing ? Level::kThreads : picture->level);
+  return status == KIF_STATUS_OK ? PlaceOfThread(id, place) : status;
+}
+
+KIF_Status ReadCommandLineFile(int32_t id, char *text) {
+  char path[kPathSize];
+  char raw[kCommandLineRead];
+  size_t length;
+  snprintf(path, sizeof(path), "%d/cmdline", id);
+  const KIF_Status status = ReadBelow(picture->proc.fd(), path, raw, sizeof(raw), &length);
+  text[0] = '\0';
+  if (status == KIF_STATUS_NOT_FOUND) return KIF_STATUS_NO_COMMAND_LINE;
+  if (status != KIF_STATUS_OK) return status;
+  for (size_t i = 0; i < length; ++i) {
+    if (raw[i] == '\0') raw[i] = ' ';
+  }
+  while (length > 0 && raw[length - 1] == ' ') --length;
+  if (length == 0) return KIF_STATUS_NO_COMMAND_LINE;
+  CopyText(text, kCommandLineSize, raw, length);
+  return KIF_STATUS_OK;
+}
+
+// A process with a command line is no kernel thread and no zombie; only the others are looked at
+// more closely.
+KIF_Status AppendCartel(int32_t id) {
+  Process process = NewProcess(id);
+  char text[kCommandLineSize];
+  const KIF_Status read = ReadCommandLineFile(id, text);
+  if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
+  if (read == KIF_STATUS_OK) {
+    process.commandLine = static_cast<uint32_t>(picture->commandLines.size());
+    if (!picture->commandLines.Append(text, strlen(text) + 1)) return KIF_STATUS_NO_MEMORY;
+  } else {
+    Stat stat;
+    if (ReadThreadStat(id, id, &stat) != KIF_STATUS_OK) return KIF_STATUS_OK;
+    FillProcess(stat, &process);
+    if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
+  }
+  return picture->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+}
+
+KIF_Status IndexChildren() {
+  if (picture->byParent.size() == picture->processes.size()) return KIF_STATUS_OK;
+  picture->byParent.Clear();
+  for (uint32_t i = 0; i < picture->processes.size(); ++i) {
+    if (!picture->byParent.Append({picture->processes[i].parent, i})) return KIF_STATUS_NO_MEMORY;
+  }
+  std::sort(picture->byParent.begin(), picture->byParent.end(),
+            [](const ChildPlace &a, const ChildPlace &b) {
+              return a.parent != b.parent ? a.parent < b.parent : a.place < b.place;
+            });
+  return KIF_STATUS_OK;
+}
+
+// A mask of CPUs as a list of ranges.
+void FormatCpus(const unsigned char *mask, size_t maskSize, char *text, size_t size) {
+  const auto isSet = [&](size_t cpu) {
+    return cpu < maskSize * 8 && (mask[cpu / 8] >> (cpu % 8) & 1) != 0;
+  };
+  size_t length = 0;
+  text[0] = '\0';
+  for (size_t first = 0; first < maskSize * 8; ++first) {
+    if (!isSet(first)) continue;
+    size_t last = first;
+    while (isSet(last + 1)) ++last;
+    const char *comma = length > 0 ? "," : "";
+    const int wanted =
+        first == last ? snprintf(text + length, size - length, "%s%zu", comma, first)
+                      : snprintf(text + length, size - length, "%s%zu-%zu", comma, first, last);
+    if (wanted < 0 || static_cast<size_t>(wanted) >= size - length) {
+      text[length] = '\0';
+      return;
+    }
+    length += static_cast<size_t>(wanted);
+    first = last;
+  }
+}
+
+// In a tree taken from elsewhere the kernel's own list stands in the thread's status.
+KIF_Status ReadRecordedCpus(const Process &process, int64_t thread, char *text, size_t size) {
+  char path[kPathSize];
+  char status[8192];
+  snprintf(path, sizeof(path), "%d/task/%lld/status", process.id, static_cast<long long>(thread));
+  KIF_Status read = ReadBelow(picture->proc.fd(), path, status, sizeof(status));
+  if (read == KIF_STATUS_NOT_FOUND && process.id == thread) {
+    snprintf(path, sizeof(path), "%d/status", process.id);
+    read = ReadBelow(picture->proc.fd(), path, status, sizeof(status));
+  }
+  if (read != KIF_STATUS_OK) return read;
+  static constexpr char kKey[] = "\nCpus_allowed_list:\t";
+  const char *list = strstr(status, kKey);
+  if (list == nullptr) return KIF_STATUS_NOT_FOUND;
+  list += sizeof(kKey) - 1;
+  CopyText(text, size, list, strcspn(list, "\n"));
+  return KIF_STATUS_OK;
+}
+
+}  // namespace
+
+KIF_Status TakeThreads(const Thread **threads, size_t *count) {
+  picture->level = Level::kNothing;
+  const KIF_Status status = TakePicture(Level::kThreads);
+  *threads = picture->threads.begin();
+  *count = picture->threads.size();
+  return status;
+}
+
+KIF_Status TakeCartels() {
+  Array<int32_t> ids;
+  KIF_Status status = BeginPicture(&ids);
+  picture->commandLines.Clear();
+  for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) status = AppendCartel(ids[i]);
+  if (status == KIF_STATUS_OK) picture->level = Level::kCartels;
+  return status;
+}
+
+KIF_Status ForEachCartel(KIF_Status (*give)(int32_t id, void *context), void *context) {
+  KIF_Status status = KIF_STATUS_OK;
+  for (const Process &process : picture->processes) {
+    if (process.isKernel || process.isZombie) continue;
+    status = give(process.id, context);
+    if (status != KIF_STATUS_OK) break;
+  }
+  return status;
+}
+
+KIF_Status FindThread(int64_t id, ThreadValue value, const Thread **thread,
+                      const Process **process) {
+  uint32_t place;
+  KIF_Status status = LookUpThread(id, value, &place);
+  if (status != KIF_STATUS_OK) return status;
+  Thread &found = picture->threads[place];
+  const auto bit = static_cast<uint8_t>(value);
+  if ((found.served & bit) != 0) {
+    status = RefreshThread(&found);
+    if (status != KIF_STATUS_OK) return status;
+  }
+  found.served |= bit;
+  *thread = &found;
+  *process = &picture->processes[found.process];
+  if (value == ThreadValue::kInfo && lastCommandLine.process == (*process)->id) {
+    lastCommandLine.current = true;
+  }
+  return KIF_STATUS_OK;
+}
+
+KIF_Status ForEachChild(int64_t parent, KIF_Status (*give)(int32_t id, void *context),
+                        void *context) {
+  KIF_Status status = NeedLevel(Level::kProcesses);
+  if (status == KIF_STATUS_OK) status = IndexChildren();
+  if (status != KIF_STATUS_OK) return status;
+  if (FindProcess(parent) == nullptr) return KIF_STATUS_NOT_FOUND;
+  const ChildPlace *child = std::lower_bound(
+      picture->byParent.begin(), picture->byParent.end(), parent,
+      [](const ChildPlace &place, int64_t wanted) { return place.parent < wanted; });
+  for (; child != picture->byParent.end() && child->parent == parent; ++child) {
+    status = give(picture->processes[child->place].id, context);
+    if (status != KIF_STATUS_OK) return status;
+  }
+  return KIF_STATUS_OK;
+}
+
+KIF_Status FindChild(int64_t parent, int64_t child, const Process **process) {
+  const KIF_Status status = NeedLevel(Level::kProcesses);
+  if (status != KIF_STATUS_OK) return status;
+  *process = FindProcess(child);
+  return *process != nullptr && (*process)->parent == parent ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
+}
+
+KIF_Status ReadCommandLine(int64_t id, char *text) {
+  if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
+  if (picture->level == Level::kNothing) {
+    const KIF_Status status = TakeCartels();
+    if (status != KIF_STATUS_OK) return status;
+  }
+  Process *process = FindProcess(id);
+  if (process != nullptr && process->commandLine != kNoCommandLine) {
+    strcpy(text, picture->commandLines.text() + process->commandLine);
+    process->commandLine = kNoCommandLine;
+    return KIF_STATUS_OK;
+  }
+  if (lastCommandLine.process != id || !lastCommandLine.current) {
+    lastCommandLine.status = ReadCommandLineFile(static_cast<int32_t>(id), lastCommandLine.text);
+    lastCommandLine.process = id;
+  }
+  lastCommandLine.current = false;
+  strcpy(text, lastCommandLine.text);
+  return lastCommandLine.status;
+}
+
+KIF_Status ReadAllowedCpus(int64_t id, char *text, size_t size) {
+  if (IsForeignRoot()) {
+    uint32_t place;
+    const KIF_Status status = LookUpThread(id, ThreadValue::kState, &place);
+    if (status != KIF_STATUS_OK) return status;
+    return ReadRecordedCpus(picture->processes[picture->threads[place].process], id, text, size);
+  }
+  if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
+  static unsigned char mask[8192 / 8];  // NR_CPUS is at most 8192
+  static unsigned char lastMask[sizeof(mask)];
+  static char lastText[2304];
+  // The system call itself tells how much of the mask the kernel has; libc's wrapper does not.
+  const long given = syscall(SYS_sched_getaffinity, static_cast<pid_t>(id), sizeof(mask), mask);
+  if (given < 0) return StatusOfErrno(errno);
+  if (lastText[0] == '\0' || memcmp(mask, lastMask, sizeof(mask)) != 0) {
+    memcpy(lastMask, mask, sizeof(mask));
+    FormatCpus(mask, static_cast<size_t>(given), lastText, sizeof(lastText));
+  }
+  snprintf(text, size, "%s", lastText);
+  return KIF_STATUS_OK;
+}

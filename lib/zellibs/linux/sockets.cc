@@ -1,0 +1,308 @@
+#include "linux/sockets.h"
+
+#include <arpa/inet.h>
+#include <fcntl.h>
+#include <stdio.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <iterator>
+
+#include "linux/array.h"
+#include "linux/everlasting.h"
+#include "linux/files.h"
+#include "status.h"
+
+namespace {
+
+enum class Layout : uint8_t { kInternet, kUnix, kNetlink, kPacket };
+
+struct Table {
+  const char *file;      // in /proc/net
+  const char *protocol;  // as it is shown
+  Layout layout;
+  uint8_t inodeField;  // fields of a line are counted from 0
+};
+
+constexpr Table kTables[] = {
+    {"unix", "unix", Layout::kUnix, 6},
+    {"tcp", "TCP", Layout::kInternet, 9},
+    {"tcp6", "TCP", Layout::kInternet, 9},
+    {"udp", "UDP", Layout::kInternet, 9},
+    {"udp6", "UDP", Layout::kInternet, 9},
+    {"udplite", "UDPLITE", Layout::kInternet, 9},
+    {"udplite6", "UDPLITE", Layout::kInternet, 9},
+    {"raw", "RAW", Layout::kInternet, 9},
+    {"raw6", "RAW", Layout::kInternet, 9},
+    {"icmp", "ICMP", Layout::kInternet, 9},
+    {"icmp6", "ICMP", Layout::kInternet, 9},
+    {"netlink", "netlink", Layout::kNetlink, 9},
+    {"packet", "packet", Layout::kPacket, 8},
+};
+
+// include/net/tcp_states.h
+constexpr const char *kTcpStates[] = {
+    nullptr, "ESTABLISHED", "SYN_SENT", "SYN_RECV", "FIN_WAIT1", "FIN_WAIT2", "TIME_WAIT",
+    "CLOSE", "CLOSE_WAIT",  "LAST_ACK", "LISTEN",   "CLOSING",   "SYN_RECV",  "BOUND",
+};
+
+// include/uapi/linux/net.h, socket_state
+constexpr const char *kUnixStates[] = {
+    nullptr, "UNCONNECTED", "CONNECTING", "CONNECTED", "DISCONNECTING",
+};
+constexpr unsigned long kAcceptsConnections = 0x10000;  // __SO_ACCEPTCON, include/linux/net.h
+
+// include/linux/net.h, sock_type
+constexpr const char *kTypes[] = {nullptr, "STREAM", "DGRAM", "RAW", "RDM", "SEQPACKET", "DCCP"};
+
+// include/uapi/linux/netlink.h
+constexpr const char *kNetlinkProtocols[] = {
+    "ROUTE",         nullptr,    "USERSOCK", "FIREWALL",       "SOCK_DIAG",  "NFLOG",
+    "XFRM",          "SELINUX",  "ISCSI",    "AUDIT",          "FIB_LOOKUP", "CONNECTOR",
+    "NETFILTER",     "IP6_FW",   "DNRTMSG",  "KOBJECT_UEVENT", "GENERIC",    nullptr,
+    "SCSITRANSPORT", "ECRYPTFS", "RDMA",     "CRYPTO",         "SMC",
+};
+
+struct Socket {
+  uint64_t inode;
+  size_t line;    // place in the texts
+  size_t length;  // of the line, without its newline
+  uint8_t table;  // place in kTables
+};
+
+// The sockets of all namespaces read so far. A process may hold sockets of other namespaces than
+// its own (a service manager passes them on), and inode numbers are unique among all of them.
+struct Sockets {
+  Array<uint64_t> namespaces;  // inode numbers
+  Bytes texts;                 // the tables, one behind the other
+  Array<Socket> byInode;
+};
+
+Everlasting<Sockets> sockets;
+
+// The name at `number` of a list; null where it has none.
+template <size_t kCount>
+const char *NameOf(const char *const (&names)[kCount], unsigned long number) {
+  return number < kCount ? names[number] : nullptr;
+}
+
+// The blank-separated field `index` of a line. At the line's end: its newline or NUL.
+const char *FieldOf(const char *line, unsigned index) {
+  const char *place = line + strspn(line, " ");
+  for (; index > 0; --index) {
+    place += strcspn(place, " \n");
+    place += strspn(place, " ");
+  }
+  return place;
+}
+
+unsigned long HexadecimalField(const char *line, unsigned index) {
+  const char *field = FieldOf(line, index);
+  return *field != '\n' ? strtoul(field, nullptr, 16) : 0;
+}
+
+KIF_Status IndexLines(size_t start, uint8_t table) {
+  const char *texts = sockets->texts.text();
+  for (size_t line = start; line < sockets->texts.size();) {
+    const size_t rest = sockets->texts.size() - line;
+    const void *newline = memchr(texts + line, '\n', rest);
+    const size_t length =
+        newline != nullptr ? static_cast<size_t>(static_cast<const char *>(newline) - texts) - line
+                           : rest;
+    const char *field = FieldOf(texts + line, kTables[table].inodeField);
+    uint64_t inode;
+    // Sockets that no process holds any more, or not yet, have the number 0.
+    if (TakeNumber(&field, &inode) && inode != 0 &&
+        !sockets->byInode.Append({inode, line, length, table})) {
+      return KIF_STATUS_NO_MEMORY;
+    }
+    line += length + 1;
+  }
+  return KIF_STATUS_OK;
+}
+
+// Reads the table in the directory `net`. A kernel without the protocol has no such file.
+KIF_Status ReadTable(int net, uint8_t table) {
+  Descriptor file;
+  KIF_Status status = OpenBelow(net, kTables[table].file, O_RDONLY, &file);
+  if (status == KIF_STATUS_NO_RESOURCES || status == KIF_STATUS_NO_MEMORY) return status;
+  if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
+  const size_t start = sockets->texts.size();
+  status = sockets->texts.ReadAll(file.fd());
+  return status == KIF_STATUS_NO_MEMORY ? status : IndexLines(start, table);
+}
+
+// Number of the network namespace of a process. Trees made by hand need not say; all of their
+// processes are then in one.
+KIF_Status NamespaceOf(int process, uint64_t *number) {
+  char text[64];
+  const KIF_Status status = ReadLinkBelow(process, "ns/net", text, sizeof(text));
+  *number = 0;
+  if (status != KIF_STATUS_OK) return IsForeignRoot() ? KIF_STATUS_OK : status;
+  const char *place = text + strcspn(text, "0123456789");
+  TakeNumber(&place, number);
+  return KIF_STATUS_OK;
+}
+
+KIF_Status OpenTables(int process, Descriptor *net) {
+  const KIF_Status status = OpenBelow(process, "net", O_PATH | O_DIRECTORY, net);
+  if (status == KIF_STATUS_OK || !IsForeignRoot()) return status;
+  return OpenHostFile("/proc/net", O_PATH | O_DIRECTORY, net);
+}
+
+const Socket *FindSocket(uint64_t inode) {
+  const Array<Socket> &known = sockets->byInode;
+  const Socket *found =
+      std::lower_bound(known.begin(), known.end(), inode,
+                       [](const Socket &socket, uint64_t wanted) { return socket.inode < wanted; });
+  return found != known.end() && found->inode == inode ? found : nullptr;
+}
+
+struct Endpoint {
+  unsigned char address[16];
+  size_t size;  // of the address: 4 or 16
+  unsigned long port;
+};
+
+// "0100007F:0016": the address as words in the machine's byte order, the port as a number.
+bool ParseEndpoint(const char *field, Endpoint *endpoint) {
+  constexpr size_t kWordDigits = 8;
+  const size_t digits = strspn(field, "0123456789ABCDEFabcdef");
+  if ((digits != kWordDigits && digits != 4 * kWordDigits) || field[digits] != ':') return false;
+  endpoint->size = digits / 2;
+  for (size_t i = 0; i < digits; i += kWordDigits) {
+    char word[kWordDigits + 1] = {};
+    memcpy(word, field + i, kWordDigits);
+    const auto value = static_cast<uint32_t>(strtoul(word, nullptr, 16));
+    memcpy(endpoint->address + i / 2, &value, sizeof(value));
+  }
+  endpoint->port = strtoul(field + digits + 1, nullptr, 16);
+  // An IPv4 peer of an IPv6 socket is shown as what it is.
+  static constexpr unsigned char kMapped[12] = {0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0xff, 0xff};
+  if (endpoint->size == 16 && memcmp(endpoint->address, kMapped, sizeof(kMapped)) == 0) {
+    memmove(endpoint->address, endpoint->address + sizeof(kMapped), 4);
+    endpoint->size = 4;
+  }
+  return true;
+}
+
+bool HasAddress(const Endpoint &endpoint) {
+  return std::any_of(endpoint.address, endpoint.address + endpoint.size,
+                     [](unsigned char byte) { return byte != 0; });
+}
+
+// "[", an address, "]:", a port, NUL.
+constexpr size_t kEndpointSize = INET6_ADDRSTRLEN + 16;
+
+void FormatEndpoint(const Endpoint &endpoint, char *text) {
+  char address[INET6_ADDRSTRLEN] = "*";
+  char port[12] = "*";
+  const bool isVersion6 = endpoint.size == 16;
+  const bool hasAddress = HasAddress(endpoint);
+  if (hasAddress) {
+    inet_ntop(isVersion6 ? AF_INET6 : AF_INET, endpoint.address, address, sizeof(address));
+  }
+  if (endpoint.port != 0) {
+    snprintf(port, sizeof(port), "%u", static_cast<unsigned>(endpoint.port & 0xffff));
+  }
+  const bool bracketed = isVersion6 && hasAddress;
+  snprintf(text, kEndpointSize, bracketed ? "[%s]:%s" : "%s:%s", address, port);
+}
+
+bool FormatInternet(const Table &table, const char *line, char *text, size_t size) {
+  Endpoint local;
+  Endpoint remote;
+  if (!ParseEndpoint(FieldOf(line, 1), &local) || !ParseEndpoint(FieldOf(line, 2), &remote)) {
+    return false;
+  }
+  char from[kEndpointSize];
+  char to[kEndpointSize] = "";
+  FormatEndpoint(local, from);
+  const bool isConnected = HasAddress(remote) || remote.port != 0;
+  if (isConnected) FormatEndpoint(remote, to);
+  const bool hasState = strcmp(table.protocol, "TCP") == 0;
+  const char *state = hasState ? NameOf(kTcpStates, HexadecimalField(line, 3)) : nullptr;
+  snprintf(text, size, "%s %s%s%s%s%s%s", table.protocol, from, isConnected ? "->" : "", to,
+           state != nullptr ? " (" : "", state != nullptr ? state : "",
+           state != nullptr ? ")" : "");
+  return true;
+}
+
+// What a socket without a name is called, its inode number, is all that tells it from others.
+void FormatUnix(const Socket &socket, const char *line, char *text, size_t size) {
+  char unnamed[32];
+  const char *name = FieldOf(line, 6);
+  name += strspn(name, "0123456789");
+  if (*name == ' ') ++name;
+  size_t length = socket.length - static_cast<size_t>(name - line);
+  if (length == 0) {
+    snprintf(unnamed, sizeof(unnamed), "socket:[%llu]",
+             static_cast<unsigned long long>(socket.inode));
+    name = unnamed;
+    length = strlen(unnamed);
+  }
+  const char *type = NameOf(kTypes, HexadecimalField(line, 4));
+  const bool listens = (HexadecimalField(line, 3) & kAcceptsConnections) != 0;
+  const char *state = listens ? "LISTEN" : NameOf(kUnixStates, HexadecimalField(line, 5));
+  snprintf(text, size, "unix %.*s type=%s (%s)", static_cast<int>(std::min(length, size)), name,
+           type != nullptr ? type : "?", state != nullptr ? state : "?");
+}
+
+void FormatNetlink(const char *line, char *text, size_t size) {
+  const unsigned long number = strtoul(FieldOf(line, 1), nullptr, 10);
+  const char *name = NameOf(kNetlinkProtocols, number);
+  if (name != nullptr) {
+    snprintf(text, size, "netlink %s", name);
+  } else {
+    snprintf(text, size, "netlink %lu", number);
+  }
+}
+
+void FormatPacket(const char *line, char *text, size_t size) {
+  const char *type = NameOf(kTypes, HexadecimalField(line, 2));
+  snprintf(text, size, "packet protocol=0x%04lx type=%s", HexadecimalField(line, 3),
+           type != nullptr ? type : "?");
+}
+
+}  // namespace
+
+KIF_Status ReadSocketsOf(int process) {
+  uint64_t number;
+  if (NamespaceOf(process, &number) != KIF_STATUS_OK) return KIF_STATUS_OK;
+  const Array<uint64_t> &known = sockets->namespaces;
+  if (std::find(known.begin(), known.end(), number) != known.end()) return KIF_STATUS_OK;
+  Descriptor net;
+  KIF_Status status = OpenTables(process, &net);
+  if (status == KIF_STATUS_NO_RESOURCES) return status;
+  if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
+  if (!sockets->namespaces.Append(number)) return KIF_STATUS_NO_MEMORY;
+  for (uint8_t table = 0; status == KIF_STATUS_OK && table < std::size(kTables); ++table) {
+    status = ReadTable(net.fd(), table);
+  }
+  std::sort(sockets->byInode.begin(), sockets->byInode.end(), [](const Socket &a, const Socket &b) {
+    return a.inode != b.inode ? a.inode < b.inode : a.line < b.line;
+  });
+  return status;
+}
+
+bool DescribeSocket(uint64_t inode, char *text, size_t size) {
+  const Socket *socket = FindSocket(inode);
+  if (socket == nullptr) return false;
+  const Table &table = kTables[socket->table];
+  const char *line = sockets->texts.text() + socket->line;
+  switch (table.layout) {
+    case Layout::kInternet:
+      return FormatInternet(table, line, text, size);
+    case Layout::kUnix:
+      FormatUnix(*socket, line, text, size);
+      break;
+    case Layout::kNetlink:
+      FormatNetlink(line, text, size);
+      break;
+    case Layout::kPacket:
+      FormatPacket(line, text, size);
+      break;
+  }
+  return true;
+}

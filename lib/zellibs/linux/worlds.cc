@@ -1,0 +1,197 @@
+// The subtrees world, sched_Vcpus and userworld_cartel: threads as worlds, processes as cartels.
+#include <cstddef>
+#include <cstdio>
+#include <cstring>
+
+#include "linux/files.h"
+#include "linux/linux_nodes.h"
+#include "linux/processes.h"
+
+namespace {
+
+struct __attribute__((packed)) WorldInfoRecord {
+  uint32_t worldID;
+  int32_t groupID;
+  uint32_t userspaceID;
+  uint32_t cartelID;
+  int32_t parentCartelID;
+  int32_t processGroupID;
+  int32_t sessionID;
+  uint32_t worldType;
+  unsigned char unused[13];
+  int32_t securityDomain;
+  unsigned char reserved[23];
+};
+static_assert(sizeof(WorldInfoRecord) == 72 && offsetof(WorldInfoRecord, securityDomain) == 45);
+
+enum WorldType : uint32_t {
+  kSystem = 0x1,
+  kUser = 0x4,
+  kVirtualMachineMonitor = 0x8,
+  kClone = 0x20,
+};
+
+// The run and wait states that a state letter of proc(5) stands for: places in the tables below.
+struct State {
+  char letter;
+  uint32_t run;
+  uint32_t wait;
+};
+
+enum RunState : uint32_t {
+  kRun,
+  kSleep,
+  kDisk,
+  kStop,
+  kTrace,
+  kPark,
+  kIdle,
+  kZombie,
+  kDead,
+  kOther
+};
+enum WaitState : uint32_t { kNone, kInterruptible, kUninterruptible, kSignal, kTracer, kUnpark };
+
+constexpr State kStates[] = {
+    {'R', kRun, kNone},
+    {'S', kSleep, kInterruptible},
+    {'D', kDisk, kUninterruptible},
+    {'T', kStop, kSignal},
+    {'t', kTrace, kTracer},
+    {'P', kPark, kUnpark},
+    {'I', kIdle, kUninterruptible},
+    {'Z', kZombie, kNone},
+    {'X', kDead, kNone},
+};
+
+KIF_Status AppendInteger(int32_t id, void *list) {
+  return KIF_ParamListAddInt(static_cast<KIF_ParamList *>(list), id);
+}
+
+int64_t FirstInteger(const KIF_ParamList *instance) {
+  return instance->params[0].integer;
+}
+
+// KVM names the threads of a guest's processors "CPU 0/KVM".
+bool IsVirtualCpu(const char *name) {
+  unsigned number;
+  int end = 0;
+  return sscanf(name, "CPU %u/KVM%n", &number, &end) == 1 && end > 0 && name[end] == '\0';
+}
+
+uint32_t TypeOf(const Thread &thread, const Process &process) {
+  if (process.isKernel) return kSystem;
+  uint32_t type = kUser;
+  if (thread.id != process.id) type |= kClone;
+  if (IsVirtualCpu(thread.name)) type |= kVirtualMachineMonitor;
+  return type;
+}
+
+}  // namespace
+
+extern "C" {
+const CpuSched_StateElement CpuSched_RunStateElements[] = {
+    {{0, 0}, "RUN"},   {{0, 0}, "SLEEP"}, {{0, 0}, "DISK"},  {{0, 0}, "STOP"},
+    {{0, 0}, "TRACE"}, {{0, 0}, "PARK"},  {{0, 0}, "IDLE"},  {{0, 0}, "ZOMBIE"},
+    {{0, 0}, "DEAD"},  {{0, 0}, "OTHER"}, {{0, 0}, nullptr},
+};
+const CpuSched_StateElement CpuSched_WaitStateElements[] = {
+    {{0, 0}, "NONE"},   {{0, 0}, "INTR"},   {{0, 0}, "UNINT"}, {{0, 0}, "SIGNAL"},
+    {{0, 0}, "TRACER"}, {{0, 0}, "UNPARK"}, {{0, 0}, nullptr},
+};
+}
+
+KIF_Status ListWorlds(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
+  const Thread *threads;
+  size_t count;
+  KIF_Status status = TakeThreads(&threads, &count);
+  if (status == KIF_STATUS_OK && !ReserveParams(list, static_cast<uint32_t>(count))) {
+    status = KIF_STATUS_NO_MEMORY;
+  }
+  for (size_t i = 0; status == KIF_STATUS_OK && i < count; ++i) {
+    status = AppendInteger(threads[i].id, list);
+  }
+  return status;
+}
+
+KIF_Status GetWorldName(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Thread *thread;
+  const Process *process;
+  const KIF_Status status =
+      FindThread(FirstInteger(instance), ThreadValue::kName, &thread, &process);
+  if (status == KIF_STATUS_OK) strcpy(static_cast<char *>(record), thread->name);
+  return status;
+}
+
+KIF_Status GetWorldInfo(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Thread *thread;
+  const Process *process;
+  const KIF_Status status =
+      FindThread(FirstInteger(instance), ThreadValue::kInfo, &thread, &process);
+  if (status != KIF_STATUS_OK) return status;
+  auto *info = static_cast<WorldInfoRecord *>(record);
+  info->worldID = static_cast<uint32_t>(thread->id);
+  info->groupID = process->id;
+  info->processGroupID = process->group;
+  info->sessionID = process->session;
+  info->worldType = TypeOf(*thread, *process);
+  if (process->isKernel) return KIF_STATUS_OK;
+  info->userspaceID = process->userspace;
+  info->cartelID = static_cast<uint32_t>(process->id);
+  info->parentCartelID = thread->id == process->id ? process->treeParent : process->id;
+  return KIF_STATUS_OK;
+}
+
+KIF_Status GetSummaryStats(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Thread *thread;
+  const Process *process;
+  const KIF_Status status =
+      FindThread(FirstInteger(instance), ThreadValue::kState, &thread, &process);
+  if (status != KIF_STATUS_OK) return status;
+  State found = {thread->state, kOther, kNone};
+  for (const State &state : kStates) {
+    if (state.letter == thread->state) found = state;
+  }
+  memcpy(static_cast<char *>(record) + 4, &found.run, sizeof(found.run));
+  memcpy(static_cast<char *>(record) + 8, &found.wait, sizeof(found.wait));
+  return KIF_STATUS_OK;
+}
+
+KIF_Status GetAffinity(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
+  return ReadAllowedCpus(FirstInteger(instance), static_cast<char *>(record),
+                         node.offers.recordSize);
+}
+
+KIF_Status GetStateTimes(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Thread *thread;
+  const Process *process;
+  const KIF_Status status =
+      FindThread(FirstInteger(instance), ThreadValue::kTimes, &thread, &process);
+  if (status != KIF_STATUS_OK) return status;
+  constexpr uint64_t kTicksPerSecond = 100;  // USER_HZ, the same on every architecture but one
+  const uint64_t microseconds = thread->cpuTicks * (1000000 / kTicksPerSecond);
+  memcpy(static_cast<char *>(record) + 8, &microseconds, sizeof(microseconds));
+  return KIF_STATUS_OK;
+}
+
+KIF_Status ListCartels(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
+  const KIF_Status status = TakeCartels();
+  return status == KIF_STATUS_OK ? ForEachCartel(AppendInteger, list) : status;
+}
+
+KIF_Status GetCommandLine(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  return ReadCommandLine(FirstInteger(instance), static_cast<char *>(record));
+}
+
+KIF_Status ListChildren(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
+  return ForEachChild(FirstInteger(parent), AppendInteger, list);
+}
+
+KIF_Status GetChild(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Process *child;
+  const KIF_Status status = FindChild(FirstInteger(instance), instance->params[1].integer, &child);
+  if (status != KIF_STATUS_OK) return status;
+  const int32_t childState = child->isZombie ? 1 : 0;
+  memcpy(static_cast<char *>(record) + 4, &childState, sizeof(childState));
+  return KIF_STATUS_OK;
+}

@@ -1,0 +1,198 @@
+// The recorded host: the answers of a cache file.
+#include <cstring>
+
+#include "cache_file.h"
+#include "host.h"
+#include "param_list.h"
+#include "status.h"
+
+namespace {
+
+// A file may name one text any number of times; what a list's texts take in memory has an end.
+constexpr size_t kMostListText = size_t{64} << 20;
+
+CacheFile recording;
+
+// A tool that walks a list reads the records in their order: where the last look-up of each node
+// ended, the next one is tried first.
+struct Hints {
+  uint32_t record;
+  uint32_t list;
+};
+Hints hints[kNodeCount];
+
+// How a recorded parameter and a given one compare; false where the recorded one is broken.
+bool Compare(const cache::Parameter &recorded, const Param &given, int *order) {
+  const bool isText = given.type == KIF_PARAM_STRING;
+  const auto kind = !isText                 ? cache::Kind::Integer
+                    : given.text != nullptr ? cache::Kind::Text
+                                            : cache::Kind::Null;
+  if (recorded.kind() != kind) {
+    *order = recorded.kind() < kind ? -1 : 1;
+  } else if (kind == cache::Kind::Integer) {
+    *order = recorded.value() < given.integer ? -1 : recorded.value() > given.integer ? 1 : 0;
+  } else if (kind == cache::Kind::Text) {
+    const char *text = ParameterText(recording, recorded);
+    if (text == nullptr) return false;
+    *order = strcmp(text, given.text);
+  } else {
+    *order = 0;
+  }
+  return true;
+}
+
+bool Compare(const cache::Selector &selector, const KIF_ParamList *given, int *order) {
+  if (!HasParameters(recording, selector.first(), selector.count())) return false;
+  const cache::Parameter *recorded = recording.parameters + selector.first();
+  const uint32_t count = CountOf(given);
+  *order = 0;
+  for (uint32_t i = 0; *order == 0 && i < selector.count() && i < count; ++i) {
+    if (!Compare(recorded[i], given->params[i], order)) return false;
+  }
+  if (*order == 0 && selector.count() != count) *order = selector.count() < count ? -1 : 1;
+  return true;
+}
+
+// Finds the answer for `given` in `answers` (null: there are none). `*hint` is the place to try
+// first, and then the place after the answer.
+template <typename Answer>
+KIF_Status Find(const flatbuffers::Vector<const Answer *> *answers, const KIF_ParamList *given,
+                uint32_t *hint, const Answer **found) {
+  if (answers == nullptr) return KIF_STATUS_NOT_FOUND;
+  uint32_t low = 0;
+  uint32_t high = answers->size();
+  uint32_t middle = *hint < high ? *hint : high / 2;
+  while (low < high) {
+    const Answer *answer = answers->Get(middle);
+    int order;
+    if (!Compare(answer->selector(), given, &order)) return KIF_STATUS_DAMAGED_CACHE_FILE;
+    if (order == 0) {
+      *hint = middle + 1;
+      *found = answer;
+      return KIF_STATUS_OK;
+    }
+    if (order < 0) {
+      low = middle + 1;
+    } else {
+      high = middle;
+    }
+    middle = low + (high - low) / 2;
+  }
+  *hint = low;
+  return KIF_STATUS_NOT_FOUND;
+}
+
+KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
+  const NodeIndex index = IndexOf(node);
+  if (recording.nodes[index] == nullptr) return KIF_STATUS_NOT_FOUND;
+  const cache::Record *answer;
+  const KIF_Status status =
+      Find(recording.nodes[index]->records(), instance, &hints[index].record, &answer);
+  if (status != KIF_STATUS_OK) return status;
+  if (answer->status() != KIF_STATUS_OK) return answer->status();
+  if (answer->length() > node.offers.recordSize ||
+      !HasBytes(recording, answer->place(), answer->length())) {
+    return KIF_STATUS_DAMAGED_CACHE_FILE;
+  }
+  if (answer->length() > 0) memcpy(record, recording.bytes + answer->place(), answer->length());
+  return KIF_STATUS_OK;
+}
+
+KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list, size_t *textSize) {
+  switch (entry.kind()) {
+    case cache::Kind::Integer:
+      return KIF_ParamListAddInt(list, entry.value());
+    case cache::Kind::Null:
+      return KIF_ParamListAddString(list, nullptr);
+    case cache::Kind::Text: {
+      const char *text = ParameterText(recording, entry);
+      *textSize += entry.length();
+      if (text == nullptr || *textSize > kMostListText) return KIF_STATUS_DAMAGED_CACHE_FILE;
+      return KIF_ParamListAddString(list, text);
+    }
+  }
+  return KIF_STATUS_DAMAGED_CACHE_FILE;
+}
+
+KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list) {
+  const NodeIndex index = IndexOf(node);
+  if (recording.nodes[index] == nullptr) return KIF_STATUS_NOT_FOUND;
+  const cache::List *answer;
+  KIF_Status status = Find(recording.nodes[index]->lists(), parent, &hints[index].list, &answer);
+  if (status != KIF_STATUS_OK) return status;
+  if (answer->status() != KIF_STATUS_OK) return answer->status();
+  if (!HasParameters(recording, answer->first(), answer->count())) {
+    return KIF_STATUS_DAMAGED_CACHE_FILE;
+  }
+  if (!ReserveParams(list, answer->count())) return KIF_STATUS_NO_MEMORY;
+  size_t textSize = 0;
+  for (uint32_t i = 0; status == KIF_STATUS_OK && i < answer->count(); ++i) {
+    status = Append(recording.parameters[answer->first() + i], list, &textSize);
+  }
+  return status;
+}
+
+KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance,
+                       const cache::Stored **answer) {
+  const cache::Node *recorded = recording.nodes[IndexOf(node)];
+  if (recorded == nullptr) return KIF_STATUS_NOT_FOUND;
+  uint32_t hint = 0;
+  const KIF_Status status = Find(recorded->contents(), instance, &hint, answer);
+  if (status == KIF_STATUS_OK && !HasBytes(recording, (*answer)->place(), (*answer)->length())) {
+    return KIF_STATUS_DAMAGED_CACHE_FILE;
+  }
+  return status;
+}
+
+KIF_Status GetContentLength(const NodeInfo &node, const KIF_ParamList *instance, uint32_t *length) {
+  const cache::Stored *answer;
+  const KIF_Status status = FindContent(node, instance, &answer);
+  if (status != KIF_STATUS_OK) return status;
+  if (answer->length_status() != KIF_STATUS_OK) return answer->length_status();
+  *length = answer->total();
+  return KIF_STATUS_OK;
+}
+
+KIF_Status GetContent(const NodeInfo &node, const KIF_ParamList *instance, uint32_t offset,
+                      uint32_t wanted, void *bytes, uint32_t *given) {
+  const cache::Stored *answer;
+  const KIF_Status status = FindContent(node, instance, &answer);
+  if (status != KIF_STATUS_OK) return status;
+  if (answer->read_status() != KIF_STATUS_OK) return answer->read_status();
+  const uint32_t rest = offset < answer->length() ? answer->length() - offset : 0;
+  *given = wanted < rest ? wanted : rest;
+  if (*given > 0) memcpy(bytes, recording.bytes + answer->place() + offset, *given);
+  return KIF_STATUS_OK;
+}
+
+// A write is answered as recorded and forgotten.
+KIF_Status Set(const NodeInfo &node, const KIF_ParamList *instance, const KIF_ParamList *input) {
+  (void)instance;
+  (void)input;
+  const cache::Node *recorded = recording.nodes[IndexOf(node)];
+  return recorded != nullptr ? recorded->set_status() : KIF_STATUS_OK;
+}
+
+KIF_Status CheckSignature(char *date, bool *matches) {
+  const cache::Recording *facts = recording.content->recording();
+  strncpy(date, TextOrEmpty(facts->kernel_build_date()), sizeof(kInterfaceDate) - 1);
+  date[sizeof(kInterfaceDate) - 1] = '\0';
+  *matches = facts->signature() == InterfaceSignature();
+  return KIF_STATUS_OK;
+}
+
+constexpr Host kRecordedHost = {GetRecord,  GetInstances, GetContentLength,
+                                GetContent, Set,          CheckSignature};
+
+}  // namespace
+
+KIF_Status OpenRecordedHost(const char *path, const Host **host) {
+  CacheFile opened;
+  const KIF_Status status = OpenCacheFile(path, &opened);
+  if (status != KIF_STATUS_OK) return status;
+  CloseCacheFile(&recording);
+  recording = opened;
+  memset(hints, 0, sizeof(hints));
+  *host = &kRecordedHost;
+  return KIF_STATUS_OK;
+}

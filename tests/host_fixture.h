@@ -1,0 +1,69 @@
+// Runs the real programs of this build on hosts written in kifcache's text form, or on this
+// machine, and gives back what they did.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+struct Outcome {
+  std::string out;
+  std::string err;
+  int status = -1;  // exit status; minus the number of the signal that ended the program
+};
+
+// What a run gets beside its arguments.
+struct Surroundings {
+  std::vector<std::string> environment = {};  // "NAME=value", added to the test's own
+  std::string directory = {};                 // working directory; empty: the test's scratch folder
+  std::string input = {};                     // standard input
+};
+
+class HostTest : public testing::Test {
+ protected:
+  HostTest();
+  ~HostTest() override;
+
+  // Builds `hostText` into a cache file in the scratch folder and gives its path. The test fails
+  // where kifcache refuses the text.
+  std::string Record(const std::string &hostText);
+
+  // Runs `arguments` (the tool's name first) as the program form on the host, live.
+  Outcome Live(const std::string &hostText, const std::vector<std::string> &arguments,
+               Surroundings surroundings = {});
+
+  // The same as a cache run: zlkkiftools -c FILE arguments...
+  Outcome Cache(const std::string &hostText, const std::vector<std::string> &arguments,
+                Surroundings surroundings = {});
+
+  // Runs a tool on the Linux machine whose tree of files is at `root` ("/": this machine).
+  Outcome Linux(const std::string &root, const std::vector<std::string> &arguments,
+                Surroundings surroundings = {});
+
+  // Runs any program: its path or name first.
+  Outcome Run(const std::vector<std::string> &commandLine, Surroundings surroundings = {});
+
+  // Writes a file below the scratch folder, with the folders it needs, and gives its path.
+  std::string WriteFile(const std::string &path, const std::string &bytes);
+  static std::string ReadFile(const std::string &path);
+  const std::string &Scratch() const { return scratch_; }
+
+  // The lines of what the platform library wrote to its trace in the last Live, Cache or Linux
+  // run; every such run also checks that the program left no list or data object behind, unless
+  // MayLeak() was called.
+  const std::string &Trace() const { return trace_; }
+  void MayLeak() { mayLeak_ = true; }
+
+ private:
+  Outcome RunTool(const std::vector<std::string> &commandLine, Surroundings surroundings,
+                  const std::string &host);
+
+  std::string scratch_;
+  std::string trace_;
+  int recorded_ = 0;
+  bool mayLeak_ = false;
+};
+
+// Whether a program of this name is installed on the machine.
+bool IsInstalled(const std::string &program);
