@@ -1,0 +1,135 @@
+// lsof: lists the open descriptors and mapped files of every cartel.
+#include <stddef.h>
+#include <stdint.h>
+#include <stdio.h>
+
+#include "kif/kif.h"
+#include "output.h"
+#include "tools.h"
+#include "worlds/world_records.h"
+
+namespace {
+
+// KIF_NODE_userworld_cartel_fd_fds, for a cartel ID and a descriptor number.
+struct __attribute__((packed)) DescriptorRecord {
+  unsigned char unused0[4];
+  char kind[96];
+  char description[1984];
+};
+static_assert(sizeof(DescriptorRecord) == 2084);
+static_assert(offsetof(DescriptorRecord, kind) == 4 &&
+              offsetof(DescriptorRecord, description) == 100);
+
+// KIF_NODE_userworld_cartel_mem_mmaps, for a cartel ID and a mapping of its list.
+struct __attribute__((packed)) MappingRecord {
+  unsigned char unused0[8];
+  uint32_t length;  // in bytes
+  unsigned char unused12[4];
+  uint32_t kind;
+  uint32_t protection;  // set of kReadable, kWritable
+  int32_t descriptor;
+  char description[2008];
+};
+static_assert(sizeof(MappingRecord) == 2036);
+static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
+              offsetof(MappingRecord, protection) == 20 &&
+              offsetof(MappingRecord, descriptor) == 24 &&
+              offsetof(MappingRecord, description) == 28);
+
+constexpr uint32_t kListedMappingKind = 2;
+constexpr uint32_t kReadable = 0x1;
+constexpr uint32_t kWritable = 0x2;
+
+struct Cartel {
+  int32_t cartelID;
+  const char *name;  // of its main world
+};
+
+void PrintRow(const Cartel &cartel, int32_t descriptor, DescriptorRecord *record) {
+  const Shown name(cartel.name);
+  const Shown kind(FieldText(record->kind));
+  const Shown description(FieldText(record->description));
+  printf("%-10d  %-20s  %-20s   %6d   %s\n", cartel.cartelID, name.text(), kind.text(), descriptor,
+         description.text());
+}
+
+void PrintRow(const Cartel &cartel, int32_t, MappingRecord *record) {
+  if (record->kind != kListedMappingKind) return;
+  const Shown name(cartel.name);
+  const Shown description(FieldText(record->description));
+  printf("%-10d  %-20s  %-20s   %6d   %s (prot:%s%s/len:%u)\n", cartel.cartelID, name.text(),
+         "MMAP", record->descriptor, description.text(),
+         (record->protection & kReadable) != 0 ? "R" : "-",
+         (record->protection & kWritable) != 0 ? "W" : "-", record->length);
+}
+
+// Prints the rows of the `objects`, instances of `node`, of the cartel that `selector` holds;
+// `what` is their name in the message. Fails only where an object cannot be selected.
+template <typename Record>
+KIF_Status PrintObjects(KIF_NodeId node, const char *what, const Cartel &cartel,
+                        KIF_ParamList *objects, KIF_ParamList *selector) {
+  const int32_t count = KIF_ParamListUsedCount(objects);
+  for (int32_t i = 0; i < count; ++i) {
+    KIF_Param *param = KIF_ParamListGetParam(objects, static_cast<uint32_t>(i));
+    if (param == nullptr) continue;
+    const int64_t value = KIF_ParamGetInt(param);
+    const AppendedInt object(selector, value);
+    if (object.status() != 0) {
+      printf("failed to add %s to KIF parameter list\n", what);
+      return object.status();
+    }
+    Record record = {};
+    if (ReadRecord(node, selector, &record) == 0) {
+      PrintRow(cartel, static_cast<int32_t>(value), &record);
+    }
+  }
+  return 0;
+}
+
+// Prints the rows of the cartel that `selector` holds, as far as it can be read.
+KIF_Status PrintCartel(int32_t cartelID, KIF_ParamList *selector) {
+  WorldName world = {};
+  if (ReadRecord(KIF_NODE_world_name, selector, &world) != 0) return 0;
+  const Cartel cartel = {cartelID, FieldText(world.name)};
+
+  ParamListHandle descriptors;
+  if (GetInstanceList(KIF_NODE_userworld_cartel_fd_fds, selector, &descriptors) != 0) return 0;
+  const KIF_Status status = PrintObjects<DescriptorRecord>(KIF_NODE_userworld_cartel_fd_fds, "fd",
+                                                           cartel, descriptors.get(), selector);
+  descriptors.reset();
+  if (status != 0) return status;
+
+  ParamListHandle mappings;
+  if (GetInstanceList(KIF_NODE_userworld_cartel_mem_mmaps, selector, &mappings) != 0) return 0;
+  return PrintObjects<MappingRecord>(KIF_NODE_userworld_cartel_mem_mmaps, "mmap", cartel,
+                                     mappings.get(), selector);
+}
+
+KIF_Status WalkWorldList() {
+  const ParamListHandle selector = CreateInstance();
+  if (selector == nullptr) {
+    fputs("WalkWorldList: Not enough memory\n", stderr);
+    return 0;
+  }
+  ParamListHandle cartels;
+  KIF_Status status = GetInstanceList(KIF_NODE_userworld_cartel, nullptr, &cartels);
+  if (status != 0) {
+    fprintf(stderr, "WalkWorldList: error fetching world list 0x%x\n", status);
+    return status;
+  }
+  puts("Cartel    |      World name     |        Type         |   fd   |  Description     ");
+  puts("----------+---------------------+---------------------+--------+------------------");
+  InstanceWalk walk(cartels.get(), selector.get());
+  while (walk.Next()) {
+    const auto cartelID = static_cast<int32_t>(KIF_ParamGetInt(walk.param()));
+    status = PrintCartel(cartelID, selector.get());
+    if (status != 0) return status;
+  }
+  return walk.failed() ? KIF_STATUS_FAILURE : 0;
+}
+
+}  // namespace
+
+int LsofEntry(int, char **) {
+  return static_cast<int>(WalkWorldList());
+}

@@ -1,0 +1,120 @@
+// ps: lists the worlds or cartels of the host, flat or as one tree for each userspace.
+#include <getopt.h>
+#include <stdio.h>
+#include <stdlib.h>
+
+#include "tools.h"
+#include "worlds/ps_options.h"
+#include "worlds/world_list.h"
+
+namespace {
+
+constexpr char kUsage[] =
+    "ps\n"
+    "    -C           Display only cartels\n"
+    "    -P           Display PCID\n"
+    "    -T           Display used time\n"
+    "    -c           Display verbose command line\n"
+    "    -g           Display session ID and process group\n"
+    "    -i           Display summary information\n"
+    "    -j           Display GID\n"
+    "    -n           Display nChildren (only with --tree)\n"
+    "    -N           Display nThreads  (only with --tree)\n"
+    "    -s           Display state\n"
+    "    -t           Display type\n"
+    "    -u           Display only userworlds\n"
+    "    -U [N]       Display [only] userspace ID\n"
+    "    -v           Display non truncated values\n"
+    "    -Z           Display the security domain\n"
+    "    -z           Display zombie cartels\n"
+    "    -J or --tree Display userworlds in a tree layout\n";
+static_assert(sizeof(kUsage) - 1 == 719);
+
+constexpr char kShortOptions[] = "CPTcghijnNstuU::vZzJ";
+
+constexpr option kLongOptions[] = {
+    {"help", no_argument, nullptr, 'h'},
+    {"tree", no_argument, nullptr, 'J'},
+    {nullptr, 0, nullptr, 0},
+};
+
+struct OptionLetter {
+  int letter;
+  PsOptions options;
+};
+
+constexpr OptionLetter kOptionLetters[] = {
+    {'C', PS_CARTELS_ONLY},
+    {'P', PS_PCID},
+    {'T', PS_TIME},
+    {'c', PS_COMMAND},
+    {'g', PS_PGID_SID},
+    {'i', PS_SUMMARY},
+    {'j', PS_GID},
+    {'n', PS_NCHILDREN},
+    {'N', PS_NTHREADS},
+    {'s', PS_STATE},
+    {'t', PS_TYPE},
+    {'u', PS_USERWORLDS_ONLY},
+    {'U', PS_USERSPACE},
+    {'v', PS_VERBOSE},
+    {'Z', PS_SECURITY_DOMAIN},
+    {'z', PS_ZOMBIES},
+    {'J', PS_TREE | PS_USERWORLDS_ONLY | PS_ZOMBIES},
+};
+
+// The display options of a letter; 0 for any other.
+PsOptions OptionsOf(int letter) {
+  for (const OptionLetter &row : kOptionLetters) {
+    if (row.letter == letter) return row.options;
+  }
+  return 0;
+}
+
+// A number beyond 32 bits is no userspace's, and must not become another's.
+void RequestUserspace(const char *number) {
+  const unsigned long value = strtoul(number, nullptr, 10);
+  requestedUserspace = value < UINT32_MAX ? static_cast<uint32_t>(value) : UINT32_MAX;
+}
+
+// False where the command line ends the run, with `*status`.
+bool ParseOptions(int argc, char **argv, PsOptions *options, int *status) {
+  int letter;
+  *status = 1;
+  while ((letter = getopt_long(argc, argv, kShortOptions, kLongOptions, nullptr)) != -1) {
+    const PsOptions added = OptionsOf(letter);
+    *options |= added;
+    if (letter == 'U' && optarg != nullptr) RequestUserspace(optarg);
+    if (added != 0) continue;
+    if (letter == 'h' || letter == '?') {
+      fputs(kUsage, stderr);
+      *status = letter == 'h' ? 0 : 1;
+    } else {
+      fprintf(stderr, "ps: getopt failed? (%c)\n", letter);
+    }
+    return false;
+  }
+  if (optind < argc) {
+    fputs("ps: no non-option arguments\n", stderr);
+    fputs(kUsage, stderr);
+    return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+int PsEntry(int argc, char **argv) {
+  PsOptions options = 0;
+  int status;
+  if (!ParseOptions(argc, argv, &options, &status)) return status;
+  if ((options & PS_NCHILDREN) != 0 && (options & PS_TREE) == 0) {
+    fputs("nChildren needs --tree\n", stderr);
+    return 1;
+  }
+  if ((options & PS_NTHREADS) != 0 && (options & PS_TREE) == 0) {
+    fputs("nThreads needs --tree\n", stderr);
+    return 1;
+  }
+  return WorldList(options) ? 0 : 1;
+}

@@ -1,0 +1,48 @@
+// Draws the output of ps on standard output. The widths follow maxWorldID and maxNameLength, which
+// do not change any more when a printer is made.
+#pragma once
+
+#include <stddef.h>
+
+#include <memory>
+
+#include "worlds/ps_options.h"
+#include "worlds/world_record.h"
+
+class PsPrinter {
+ public:
+  // `texts` are those of the records printed, and outlive the printer.
+  PsPrinter(PsOptions options, const WorldTexts &texts);
+
+  // One line of column titles.
+  void PrintHeader() const;
+
+  // One line for one record.
+  void PrintRow(const WorldRecord &record) const;
+
+  // A userspace's number, its root and everything linked below it. A root hangs under nothing.
+  // Raises deepestLevel. False, after a message, without memory for the branches of a deep tree.
+  bool PrintTree(const WorldRecord &root);
+
+ private:
+  void PrintIds(const WorldRecord &record) const;
+  void PrintGroups(const WorldRecord &record) const;
+  void PrintType(uint32_t worldType) const;
+  void PrintState(const WorldRecord &record) const;
+  bool PushBranch(const WorldRecord &record);
+  void PopBranch(const WorldRecord &record);
+
+  bool Has(PsOption option) const { return (options_ & option) != 0; }
+
+  PsOptions options_;
+  const WorldTexts &texts_;
+  int idWidth_;
+  int nameWidth_;
+  uint32_t runStates_;
+  uint32_t waitStates_;
+
+  // What a row of the tree begins with: a branch for every level above it.
+  std::unique_ptr<char, FreeDeleter> branches_;
+  size_t branchesLength_ = 0;
+  size_t branchesRoom_ = 0;
+};

@@ -1,0 +1,89 @@
+// The records of worlds and cartels as the platform library hands them out. They are packed; the
+// bytes named unused are the kernel's own.
+#pragma once
+
+#include <stddef.h>
+#include <stdint.h>
+
+// KIF_NODE_world_info, for a world ID; a cartel ID gives the cartel's main world.
+struct __attribute__((packed)) WorldInfo {
+  uint32_t worldID;
+  int32_t groupID;
+  uint32_t userspaceID;    // 0: none
+  uint32_t cartelID;       // 0: a kernel world
+  int32_t parentCartelID;  // 0: the root of its userspace
+  int32_t processGroupID;
+  int32_t sessionID;
+  uint32_t worldType;  // set of WorldType bits
+  unsigned char unused32[13];
+  int32_t securityDomain;
+  unsigned char unused49[23];
+};
+static_assert(sizeof(WorldInfo) == 72);
+static_assert(offsetof(WorldInfo, worldID) == 0 && offsetof(WorldInfo, groupID) == 4 &&
+              offsetof(WorldInfo, userspaceID) == 8 && offsetof(WorldInfo, cartelID) == 12 &&
+              offsetof(WorldInfo, parentCartelID) == 16 &&
+              offsetof(WorldInfo, processGroupID) == 20 && offsetof(WorldInfo, sessionID) == 24 &&
+              offsetof(WorldInfo, worldType) == 28 && offsetof(WorldInfo, securityDomain) == 45);
+
+enum WorldType : uint32_t {
+  kWorldTypeSystem = 0x1,
+  kWorldTypeIdle = 0x2,
+  kWorldTypeUser = 0x4,
+  kWorldTypeVmm = 0x8,
+  kWorldTypeHelper = 0x10,
+  kWorldTypeClone = 0x20,  // a thread of the world under which it hangs
+  kWorldTypeTest = 0x40,
+  kWorldTypeAssistant = 0x100,
+};
+
+// KIF_NODE_world_name, for a world or cartel ID.
+struct __attribute__((packed)) WorldName {
+  char name[128];
+};
+static_assert(sizeof(WorldName) == 128);
+
+// KIF_NODE_sched_Vcpus_stats_summaryStats, for a world ID. The states are places in the library's
+// state tables.
+struct __attribute__((packed)) SchedSummary {
+  unsigned char unused0[4];
+  uint32_t runState;
+  uint32_t waitState;
+  unsigned char unused12[236];
+};
+static_assert(sizeof(SchedSummary) == 248);
+static_assert(offsetof(SchedSummary, runState) == 4 && offsetof(SchedSummary, waitState) == 8);
+
+// KIF_NODE_sched_Vcpus_stats_affinity, for a world ID. The text has no length of its own: it may
+// fill the record.
+struct __attribute__((packed)) SchedAffinity {
+  char cpuText[2304];
+};
+static_assert(sizeof(SchedAffinity) == 2304);
+
+// KIF_NODE_sched_Vcpus_stats_stateTimes, for a world ID.
+struct __attribute__((packed)) SchedStateTimes {
+  unsigned char unused0[8];
+  uint64_t usedTime;  // in microseconds
+  unsigned char unused16[104];
+};
+static_assert(sizeof(SchedStateTimes) == 120);
+static_assert(offsetof(SchedStateTimes, usedTime) == 8);
+
+// KIF_NODE_userworld_cartel_cmdline, for a cartel ID: the program and its arguments, separated by
+// blanks.
+struct __attribute__((packed)) CartelCommandLine {
+  char text[1024];
+};
+static_assert(sizeof(CartelCommandLine) == 1024);
+
+// KIF_NODE_userworld_cartel_child, for a cartel ID and one of its child cartel IDs.
+struct __attribute__((packed)) ChildRecord {
+  unsigned char unused0[4];
+  int32_t childState;  // kChildStateZombie, or anything else
+  unsigned char unused8[20];
+};
+static_assert(sizeof(ChildRecord) == 28);
+static_assert(offsetof(ChildRecord, childState) == 4);
+
+constexpr int32_t kChildStateZombie = 1;
