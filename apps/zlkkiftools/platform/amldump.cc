@@ -1,0 +1,178 @@
+// amldump: writes every ACPI table into a file of its own in the current directory.
+#include <errno.h>
+#include <fcntl.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <unistd.h>
+
+#include "kif/kif.h"
+#include "output.h"
+#include "tools.h"
+
+namespace {
+
+constexpr size_t kSignatureLength = 4;
+
+struct __attribute__((packed)) TableBuffer {
+  char signature[kSignatureLength + 1];  // the kernel does not end it
+  uint32_t length;                       // bytes of `data`
+  uint8_t data[131075];
+};
+static_assert(sizeof(TableBuffer) == 131084);
+static_assert(offsetof(TableBuffer, length) == 5);
+static_assert(offsetof(TableBuffer, data) == 9);
+
+// How often each signature came up, in the order in which they came up first.
+class SignatureCounter {
+ public:
+  SignatureCounter() = default;
+  ~SignatureCounter() { free(entries_); }
+  SignatureCounter(const SignatureCounter &) = delete;
+  SignatureCounter &operator=(const SignatureCounter &) = delete;
+
+  // Counts `signature` in; `*before` is how often it had come up before. False without memory.
+  bool Count(const char (&signature)[kSignatureLength + 1], int *before) {
+    size_t i = 0;
+    while (i < count_ && memcmp(entries_[i].signature, signature, sizeof(signature)) != 0) ++i;
+    if (i == count_ && !Append(signature)) return false;
+    *before = entries_[i].count++;
+    return true;
+  }
+
+ private:
+  struct Entry {
+    char signature[kSignatureLength + 1];
+    int count;
+  };
+
+  bool Append(const char (&signature)[kSignatureLength + 1]) {
+    void *grown = realloc(entries_, (count_ + 1) * sizeof(Entry));
+    if (grown == nullptr) return false;
+    entries_ = static_cast<Entry *>(grown);
+    memcpy(entries_[count_].signature, signature, sizeof(signature));
+    entries_[count_].count = 0;
+    ++count_;
+    return true;
+  }
+
+  Entry *entries_ = nullptr;
+  size_t count_ = 0;
+};
+
+// A file to be written, or none.
+class OutputFile {
+ public:
+  OutputFile() = default;
+  ~OutputFile() { Close(); }
+  OutputFile(const OutputFile &) = delete;
+  OutputFile &operator=(const OutputFile &) = delete;
+
+  bool Create(const char *name) {
+    descriptor_ = open(name, O_WRONLY | O_CREAT | O_EXCL | O_TRUNC | O_CLOEXEC, 0600);
+    return descriptor_ >= 0;
+  }
+
+  bool Write(const uint8_t *bytes, size_t length) const {
+    while (length > 0) {
+      const ssize_t written = write(descriptor_, bytes, length);
+      if (written < 0 && errno == EINTR) continue;
+      if (written <= 0) return false;
+      bytes += written;
+      length -= static_cast<size_t>(written);
+    }
+    return true;
+  }
+
+  // False when the system could not keep what was written.
+  bool Close() {
+    const bool closed = descriptor_ < 0 || close(descriptor_) == 0;
+    descriptor_ = -1;
+    return closed;
+  }
+
+ private:
+  int descriptor_ = -1;
+};
+
+bool FailWithErrno() {
+  perror("amldump: ");
+  return false;
+}
+
+// A signature becomes part of a file name, and a cache file may come from anywhere.
+bool IsFileName(const char (&signature)[kSignatureLength + 1]) {
+  const size_t length = strlen(signature);
+  for (size_t i = 0; i < kSignatureLength; ++i) {
+    const auto byte = static_cast<unsigned char>(signature[i]);
+    if (i >= length ? byte != 0 : byte < ' ' || byte == 0x7f || byte == '/') return false;
+  }
+  return length > 0 && strcmp(signature, ".") != 0 && strcmp(signature, "..") != 0;
+}
+
+bool CreateFile(const TableBuffer &record, SignatureCounter *counter, OutputFile *file) {
+  if (!IsFileName(record.signature)) {
+    fputs("amldump: the signature of a table is no file name\n", stderr);
+    return false;
+  }
+  int before = 0;
+  if (!counter->Count(record.signature, &before)) return FailWithErrno();
+  char name[32];
+  if (before != 0) {
+    snprintf(name, sizeof(name), "%s-%d.aml", record.signature, before);
+  } else {
+    snprintf(name, sizeof(name), "%s.aml", record.signature);
+  }
+  printf("Writing file %s\n", Shown(name).text());
+  return file->Create(name) || FailWithErrno();
+}
+
+// Writes the buffer number `number` of the table that `table` selects; number 0 creates the file.
+bool DumpBuffer(KIF_ParamList *table, int32_t number, SignatureCounter *counter, OutputFile *file) {
+  static TableBuffer record;
+  const AppendedInt appended(table, number);
+  if (appended.status() != 0) return false;
+  if (ReadRecord(KIF_NODE_hardware_acpi_tables_buffers, table, &record) != 0) return false;
+  FieldText(record.signature);
+  if (record.length > sizeof(record.data)) {
+    fprintf(stderr, "amldump: a buffer of %u bytes does not fit its record\n", record.length);
+    return false;
+  }
+  if (number == 0 && !CreateFile(record, counter, file)) return false;
+  return file->Write(record.data, record.length) || FailWithErrno();
+}
+
+// Dumps the table `value`; `selector` is the list that selects it.
+bool DumpTable(int32_t value, KIF_ParamList *selector, SignatureCounter *counter) {
+  const AppendedInt appended(selector, value);
+  if (appended.status() != 0) return false;
+  ParamListHandle buffers;
+  if (GetInstanceList(KIF_NODE_hardware_acpi_tables_buffers, selector, &buffers) != 0) {
+    return false;
+  }
+  const int32_t count = KIF_ParamListUsedCount(buffers.get());
+  OutputFile file;
+  for (int32_t number = 0; number < count; ++number) {
+    if (!DumpBuffer(selector, number, counter, &file)) return false;
+  }
+  return file.Close() || FailWithErrno();
+}
+
+}  // namespace
+
+int AmldumpEntry(int, char **) {
+  ParamListHandle tables;
+  if (GetInstanceList(KIF_NODE_hardware_acpi_tables, nullptr, &tables) != 0) return 1;
+  const int32_t count = KIF_ParamListUsedCount(tables.get());
+  if (count <= 0) return 0;
+
+  const ParamListHandle selector(KIF_ParamListCreate(KIF_PARAMLIST_INSTANCE, 2));
+  if (selector == nullptr) return 1;
+  SignatureCounter counter;
+  for (int32_t i = 0; i < count; ++i) {
+    int32_t value = 0;
+    if (KIF_ParamListGetInt32(tables.get(), static_cast<uint32_t>(i), &value) != 0) return 1;
+    if (!DumpTable(value, selector.get(), &counter)) return 1;
+  }
+  return 0;
+}
