@@ -1,0 +1,65 @@
+// The records of the in-memory file system: its volumes (tardisks, backed by archives, and
+// ramdisks, backed by memory) and its inodes.
+#pragma once
+
+#include <stdint.h>
+
+#include "kif/kif.h"
+
+struct __attribute__((packed)) TardiskStats {
+  uint32_t used;  // bytes
+  uint8_t unused4[4];
+  uint8_t usedToBoot;  // not 0: one of the modules that the host was booted from
+  uint8_t unused9[19];
+};
+static_assert(sizeof(TardiskStats) == 28);
+static_assert(offsetof(TardiskStats, used) == 0);
+static_assert(offsetof(TardiskStats, usedToBoot) == 8);
+
+struct __attribute__((packed)) RamdiskStats {
+  uint32_t minimum;   // MiB
+  uint32_t maximum;   // MiB
+  uint32_t used;      // pages of 4096 bytes
+  uint32_t peakUsed;  // pages
+  uint8_t unused16[164];
+};
+static_assert(sizeof(RamdiskStats) == 180);
+static_assert(offsetof(RamdiskStats, minimum) == 0);
+static_assert(offsetof(RamdiskStats, maximum) == 4);
+static_assert(offsetof(RamdiskStats, used) == 8);
+static_assert(offsetof(RamdiskStats, peakUsed) == 12);
+
+enum InodeFlags : uint32_t {
+  kInodeOnTardisk = 0x1,   // else on a ramdisk
+  kInodeUncharged = 0x40,  // its size counts as 0 bytes
+};
+
+constexpr int32_t kInodeUnlinked = -4;
+
+struct __attribute__((packed)) InodeStats {
+  uint8_t unused0[4];
+  uint32_t flags;  // InodeFlags
+  uint8_t unused8[12];
+  int32_t linkState;  // kInodeUnlinked: no directory entry leads to it
+  uint8_t unused24[4];
+  uint32_t size;  // bytes
+  char tardisk[128];
+  char ramdisk[128];
+  char name[256];
+};
+static_assert(sizeof(InodeStats) == 544);
+static_assert(offsetof(InodeStats, flags) == 4);
+static_assert(offsetof(InodeStats, linkState) == 20);
+static_assert(offsetof(InodeStats, size) == 28);
+static_assert(offsetof(InodeStats, tardisk) == 32);
+static_assert(offsetof(InodeStats, ramdisk) == 160);
+static_assert(offsetof(InodeStats, name) == 288);
+
+// Reads the statistics of the volume `name` from `node`, which must be the one of the Record.
+template <typename Record>
+KIF_Status ReadVolumeStats(KIF_NodeId node, const char *name, Record *record) {
+  const ParamListHandle instance = CreateInstance();
+  if (instance == nullptr) return KIF_STATUS_NO_MEMORY;
+  const KIF_Status status = KIF_ParamListAddString(instance.get(), name);
+  return status != 0 ? status : ReadRecord(node, instance.get(), record);
+}
