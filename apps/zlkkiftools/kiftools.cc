@@ -35,7 +35,7 @@ constexpr Tool ToolTable[] = {
     {"pgrep", PgrepEntry},     {"uptime", UptimeEntry},
 };
 
-void WriteMessage(const char *format, va_list arguments) {
+__attribute__((format(printf, 1, 0))) void WriteMessage(const char *format, va_list arguments) {
   char message[1024];
   vsnprintf(message, sizeof(message), format, arguments);
   fputs(message, stderr);

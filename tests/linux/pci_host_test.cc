@@ -88,12 +88,17 @@ TEST_F(PciHostTest, AttributesGoBeforeTheFunctionsOwnAccount) {
   WriteFile(Folder("0000:00:01.0") + "vendor", "0x15b3\n");
   WriteFile(Folder("0000:00:01.0") + "device", "0x1018\n");
   WriteFile(Folder("0000:00:01.0") + "class", "0x020000\n");
-  AddFunction("0000:00:02.0", "0780");
+  AddFunction("0000:00:02.0", "0780", 256, 1);
+  Bind("0000:00:02.0", "ahci");
   WriteFile(Folder("0000:00:02.0") + "uevent",
-            "PCI_CLASS=30000\nPCI_ID=1234:1111\nPCI_SUBSYS_ID=1AF4:1100\n");
+            "DRIVER=ahci\nPCI_CLASS=60400\nPCI_ID=1234:1111\nPCI_SUBSYS_ID=1AF4:1101\n");
   EXPECT_EQ(List({"lspci", "-n"}),
             "0000:00:01.0 Class 0200: 15b3:1018 \n"
-            "0000:00:02.0 Class 0300: 1234:1111 \n");
+            "0000:00:02.0 Class 0604: 1234:1111 \n");
+  EXPECT_EQ(Details(),
+            "0000:00:01.0 15b3:1018 1af4:1100  11/   /     B U              \n"
+            "0000:00:02.0 1234:1111 1af4:1101  11/   /     B V ahci         \n"
+            "                                  07           \n");
 }
 
 // A sleeping function is not woken: here its configuration space would even fail to open.

@@ -42,6 +42,7 @@ class PciIdsFileList {
     char *bytes = nullptr;  // null: not read yet, or nothing in it
     size_t size = 0;
     bool read = false;
+    bool mapped = false;  // bytes is a mapping, not an allocation
     bool hasNul = false;
   };
 

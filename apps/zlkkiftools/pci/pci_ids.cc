@@ -256,7 +256,8 @@ bool ReadClassFields(std::string_view text, uint8_t *number, char (&field)[kClas
 // false.
 bool AddClass(ClassPass *pass, std::string_view line) {
   if (pass->subclassPending) StoreSubclass(pass);
-  if (ReadClassFields(TextFrom(line, 1), &pass->entry.baseClass, pass->entry.className)) return true;
+  if (ReadClassFields(TextFrom(line, 1), &pass->entry.baseClass, pass->entry.className))
+    return true;
   ReportMalformed(5);
   return false;
 }
@@ -264,7 +265,8 @@ bool AddClass(ClassPass *pass, std::string_view line) {
 bool AddSubclass(ClassPass *pass, std::string_view line) {
   if (pass->subclassPending) StoreSubclass(pass);
   pass->subclassPending = true;
-  if (ReadClassFields(TextFrom(line, 1), &pass->entry.subClass, pass->entry.subClassName)) return true;
+  if (ReadClassFields(TextFrom(line, 1), &pass->entry.subClass, pass->entry.subClassName))
+    return true;
   ReportMalformed(6);
   StoreSubclass(pass);
   return false;

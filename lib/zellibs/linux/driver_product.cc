@@ -4,16 +4,18 @@
 #include <cstring>
 
 #include "linux/files.h"
-
-namespace {
+#include "status.h"
 
 // The folders in which a driver's products stand, the most telling first. In a folder only names
 // with the prefix count: "card0", but not the card's connectors.
-struct Product {
+struct ProductKind {
   const char *folder;  // null: the products stand beside the attributes
   const char *prefix;
 };
-constexpr Product kProducts[] = {
+
+namespace {
+
+constexpr ProductKind kProductKinds[] = {
     {"net", ""},      {"nvme", ""},    {"block", ""},     {nullptr, "host"},
     {"mmc_host", ""}, {"drm", "card"}, {"sound", "card"}, {"infiniband", ""},
 };
@@ -33,52 +35,50 @@ bool ComesBefore(const char *left, const char *right) {
   return leftLength != rightLength ? leftLength < rightLength : strcmp(left, right) < 0;
 }
 
-using ProductName = char[256];
-
-void KeepFirst(const char *name, ProductName &first) {
-  if (first[0] == '\0' || ComesBefore(name, first)) snprintf(first, sizeof(first), "%s", name);
+template <size_t Size>
+void KeepFirst(const char *name, char (&first)[Size]) {
+  if (first[0] == '\0' || ComesBefore(name, first)) snprintf(first, Size, "%s", name);
 }
 
-void FindInFolder(int directory, const Product &product, ProductName &found) {
+// Finds the product in the folder of its kind below the open folder `device`.
+void FindProduct(int device, ProductFolders *folders) {
+  const ProductKind *kind = folders->best;
+  if (kind == nullptr || kind->folder == nullptr) return;
+  folders->product[0] = '\0';
   DirectoryReader reader;
-  if (reader.OpenBelow(directory, product.folder) != 0) return;
+  if (reader.OpenBelow(device, kind->folder) != KIF_STATUS_OK) return;
   while (const char *name = reader.Next()) {
-    if (product.prefix[0] == '\0' || IsNumbered(name, product.prefix)) KeepFirst(name, found);
+    const bool fits = kind->prefix[0] == '\0' || IsNumbered(name, kind->prefix);
+    if (fits) KeepFirst(name, folders->product);
   }
-}
-
-// Finds what stands directly below the open folder of a device. `below` is the first folder of a
-// bus that the device carries itself (virtio0, ata1), whose products are those of the device.
-void FindProduct(DirectoryReader *folder, ProductName &product, ProductName &below) {
-  const Product *best = nullptr;
-  while (const char *name = folder->Next()) {
-    for (const Product &known : kProducts) {
-      if (best != nullptr && &known > best) break;
-      const bool fits = known.folder != nullptr ? strcmp(name, known.folder) == 0
-                                                : IsNumbered(name, known.prefix);
-      if (!fits) continue;
-      if (known.folder == nullptr) KeepFirst(name, product);
-      best = &known;
-      break;
-    }
-    if (IsNumbered(name, "virtio") || IsNumbered(name, "ata")) KeepFirst(name, below);
-  }
-  if (best == nullptr || best->folder == nullptr) return;
-  product[0] = '\0';
-  FindInFolder(folder->fd(), *best, product);
 }
 
 }  // namespace
 
-void CopyDriverProduct(int device, char *field, size_t size) {
-  ProductName product = "";
-  ProductName below = "";
-  DirectoryReader folder;
-  if (folder.OpenBelow(device, ".") == 0) FindProduct(&folder, product, below);
-  if (product[0] == '\0' && below[0] != '\0') {
-    DirectoryReader inner;
-    ProductName unused = "";
-    if (inner.OpenBelow(device, below) == 0) FindProduct(&inner, product, unused);
+void NoteProductFolder(const char *name, ProductFolders *folders) {
+  if (IsNumbered(name, "virtio") || IsNumbered(name, "ata")) KeepFirst(name, folders->carried);
+  for (const ProductKind &kind : kProductKinds) {
+    if (folders->best != nullptr && &kind > folders->best) return;
+    const bool fits =
+        kind.folder != nullptr ? strcmp(name, kind.folder) == 0 : IsNumbered(name, kind.prefix);
+    if (!fits) continue;
+    if (kind.folder == nullptr) KeepFirst(name, folders->product);
+    folders->best = &kind;
+    return;
   }
+}
+
+// What the device carries is looked at where it has made nothing of its own.
+void CopyDriverProduct(int device, const ProductFolders &folders, char *field, size_t size) {
+  ProductFolders own = folders;
+  ProductFolders below;
+  FindProduct(device, &own);
+  DirectoryReader carried;
+  if (own.product[0] == '\0' && own.carried[0] != '\0' &&
+      carried.OpenBelow(device, own.carried) == KIF_STATUS_OK) {
+    while (const char *name = carried.Next()) NoteProductFolder(name, &below);
+    FindProduct(carried.fd(), &below);
+  }
+  const char *product = own.product[0] != '\0' ? own.product : below.product;
   CopyText(field, size, product, strlen(product));
 }

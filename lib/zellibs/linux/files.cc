@@ -71,6 +71,21 @@ KIF_Status ReadBelow(int directory, const char *path, char *buffer, size_t size,
   return ReadOpened(status, file, buffer, size, length);
 }
 
+KIF_Status ReadPieceBelow(int directory, const char *path, char *buffer, size_t size,
+                          size_t *length) {
+  Descriptor file;
+  const KIF_Status status = OpenBelow(directory, path, O_RDONLY, &file);
+  ssize_t got = 0;
+  if (status == KIF_STATUS_OK) {
+    do {
+      got = read(file.fd(), buffer, size - 1);
+    } while (got < 0 && errno == EINTR);
+  }
+  *length = got > 0 ? static_cast<size_t>(got) : 0;
+  buffer[*length] = '\0';
+  return got < 0 ? StatusOfErrno(errno) : status;
+}
+
 KIF_Status ReadLinkBelow(int directory, const char *path, char *buffer, size_t size,
                          size_t *length) {
   const ssize_t got = readlinkat(directory, path, buffer, size - 1);

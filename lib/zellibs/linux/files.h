@@ -88,6 +88,11 @@ KIF_Status ReadHostFile(const char *path, char *buffer, size_t size, size_t *len
 KIF_Status ReadBelow(int directory, const char *path, char *buffer, size_t size,
                      size_t *length = nullptr);
 
+// The same for a file that the kernel gives in one piece, as it does for those of a process that
+// hold one line: one read, and no second one to see the end.
+KIF_Status ReadPieceBelow(int directory, const char *path, char *buffer, size_t size,
+                          size_t *length);
+
 // The target of a symbolic link below `directory` (AT_FDCWD with an absolute path of the host is
 // not for here), terminated, at most `size` - 1 bytes of it.
 KIF_Status ReadLinkBelow(int directory, const char *path, char *buffer, size_t size,

@@ -27,11 +27,17 @@ struct Module {
   char name[64];
 };
 
+struct Driver {
+  char name[64];
+  char module[64];  // empty: the kernel names none
+};
+
 // The list, as it was when it was last asked for.
 struct ModuleTable {
   bool read = false;
   Array<Module> modules;
-  size_t loaded = 0;  // so many of them are loaded, the others built in
+  size_t loaded = 0;      // so many of them are loaded, the others built in
+  Array<Driver> drivers;  // of functions, each once
 };
 
 Everlasting<ModuleTable> table;
@@ -77,32 +83,46 @@ uint32_t FindBuiltIn(const char *name) {
   return 0;
 }
 
-uint32_t FindInTable(const PciDriver &driver) {
-  if (driver.name[0] == '\0') return 0;
+uint32_t FindInTable(const Driver &driver) {
   uint32_t number = driver.module[0] != '\0' ? FindLoaded(driver.module) : 0;
   if (number == 0) number = FindLoaded(driver.name);
   return number != 0 ? number : FindBuiltIn(driver.name);
+}
+
+const Driver *FindDriver(const char *name) {
+  for (const Driver &driver : table->drivers) {
+    if (strcmp(driver.name, name) == 0) return &driver;
+  }
+  return nullptr;
 }
 
 int CompareModules(const void *left, const void *right) {
   return strcmp(static_cast<const Module *>(left)->name, static_cast<const Module *>(right)->name);
 }
 
-KIF_Status AddBuiltInDrivers() {
+// Takes up the driver of the function `address`, a folder below `devices`, and with it the module
+// that it makes itself when it is built in.
+KIF_Status AddDriver(int devices, const char *address) {
+  char path[300];
+  Driver driver;
+  snprintf(path, sizeof(path), "%s/driver", address);
+  CopyLinkName(devices, path, driver.name, sizeof(driver.name));
+  if (driver.name[0] == '\0' || FindDriver(driver.name) != nullptr) return KIF_STATUS_OK;
+  snprintf(path, sizeof(path), "%s/driver/module", address);
+  CopyLinkName(devices, path, driver.module, sizeof(driver.module));
+  if (!table->drivers.Append(driver)) return KIF_STATUS_NO_MEMORY;
+  return FindInTable(driver) != 0 ? KIF_STATUS_OK : AddModule(driver.name, strlen(driver.name));
+}
+
+KIF_Status AddDrivers() {
   DirectoryReader devices;
   KIF_Status status = devices.Open("/sys/bus/pci/devices");
   while (status == KIF_STATUS_OK) {
     const char *address = devices.Next();
-    if (address == nullptr) {
-      status = devices.status();
-      break;
-    }
-    PciDriver driver;
-    ReadPciDriver(devices.fd(), address, &driver);
-    if (driver.name[0] != '\0' && FindInTable(driver) == 0) {
-      status = AddModule(driver.name, strlen(driver.name));
-    }
+    if (address == nullptr) break;
+    status = AddDriver(devices.fd(), address);
   }
+  if (status == KIF_STATUS_OK) status = devices.status();
   const size_t builtIn = table->modules.size() - table->loaded;
   if (builtIn > 0) {
     qsort(table->modules.begin() + table->loaded, builtIn, sizeof(Module), CompareModules);
@@ -114,10 +134,11 @@ KIF_Status AddBuiltInDrivers() {
 KIF_Status ReadModules() {
   table->read = false;
   table->modules.Clear();
+  table->drivers.Clear();
   table->loaded = 0;
   KIF_Status status = AddLoadedModules();
   const bool hasModules = status == KIF_STATUS_OK;
-  if (status == KIF_STATUS_OK || status == KIF_STATUS_NOT_FOUND) status = AddBuiltInDrivers();
+  if (status == KIF_STATUS_OK || status == KIF_STATUS_NOT_FOUND) status = AddDrivers();
   if (status == KIF_STATUS_NOT_FOUND && hasModules) status = KIF_STATUS_OK;
   table->read = status == KIF_STATUS_OK;
   return status;
@@ -127,35 +148,25 @@ KIF_Status NeedModules() {
   return table->read ? KIF_STATUS_OK : ReadModules();
 }
 
-// The last component of a link's target, printable; empty where there is no such link.
-template <size_t Size>
-void ReadLinkName(int directory, const char *path, char (&name)[Size]) {
+}  // namespace
+
+void CopyLinkName(int directory, const char *path, char *name, size_t size) {
   char target[1024];
   name[0] = '\0';
   if (ReadLinkBelow(directory, path, target, sizeof(target)) != KIF_STATUS_OK) return;
   const char *slash = strrchr(target, '/');
   const char *last = slash != nullptr ? slash + 1 : target;
-  CopyText(name, Size, last, strlen(last));
+  CopyText(name, size, last, strlen(last));
 }
 
-}  // namespace
-
-void ReadPciDriver(int devices, const char *address, PciDriver *driver) {
-  char path[300];
-  snprintf(path, sizeof(path), "%s/driver", address);
-  ReadLinkName(devices, path, driver->name);
-  driver->module[0] = '\0';
-  if (driver->name[0] == '\0') return;
-  snprintf(path, sizeof(path), "%s/driver/module", address);
-  ReadLinkName(devices, path, driver->module);
-}
-
-KIF_Status FindModule(const PciDriver &driver, uint32_t *number) {
+KIF_Status FindModule(const char *name, uint32_t *number) {
   *number = 0;
-  if (driver.name[0] == '\0') return KIF_STATUS_OK;
+  if (name[0] == '\0') return KIF_STATUS_OK;
   const KIF_Status status = NeedModules();
-  if (status == KIF_STATUS_OK) *number = FindInTable(driver);
-  return status;
+  if (status != KIF_STATUS_OK) return status;
+  const Driver *driver = FindDriver(name);
+  if (driver != nullptr) *number = FindInTable(*driver);
+  return KIF_STATUS_OK;
 }
 
 KIF_Status ListModuleNumbers(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {

@@ -1,19 +1,15 @@
 // The kernel's modules, by number.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "kif/zellibs.h"
 
-// The name of the driver that owns a PCI function, and of its module; empty where there is none.
-struct PciDriver {
-  char name[64];
-  char module[64];
-};
+// Copies the last component of the target of a link below the open folder `directory`, printable
+// and terminated, to `name`; empty where there is no such link.
+void CopyLinkName(int directory, const char *path, char *name, size_t size);
 
-// Reads which driver owns the function `address` (a folder of /sys/bus/pci/devices) below the open
-// directory `devices`.
-void ReadPciDriver(int devices, const char *address, PciDriver *driver);
-
-// Number of the driver's module in the list of modules; 0 where it is in none.
-KIF_Status FindModule(const PciDriver &driver, uint32_t *number);
+// Number, in the list of modules, of the one that a driver of the PCI bus belongs to; 0 where it is
+// in none.
+KIF_Status FindModule(const char *driver, uint32_t *number);

@@ -15,8 +15,7 @@
 
 namespace {
 
-constexpr uint8_t kDisplayClass = 3;  // base classes
-constexpr uint8_t kBridgeClass = 6;
+constexpr uint8_t kDisplayClass = 3;  // a base class
 
 enum InfoFlag : uint8_t { kInterruptValid = 1, kSpawnedBusValid = 2 };
 enum HeaderType : uint8_t { kPlainFunction = 0, kPciBridge = 1, kCardBusBridge = 2 };
@@ -75,10 +74,38 @@ static_assert(offsetof(ConfigSpace, subVendor) == 44);
 static_assert(offsetof(ConfigSpace, interruptLine) == 60);
 static_assert(offsetof(ConfigSpace, interruptPin) == 61);
 
-// An attribute that holds one number, "0x8086"; false where it is not there.
+constexpr size_t kNameSize = 64;  // of a driver
+
+// What is known of a function before its attributes are read.
+struct FolderContents {
+  bool hasDriver = false;
+  bool hasMsi = false;
+  ProductFolders products;
+};
+
+FolderContents LookAround(DirectoryReader *folder) {
+  FolderContents contents;
+  while (const char *name = folder->Next()) {
+    if (strcmp(name, "driver") == 0) contents.hasDriver = true;
+    if (strcmp(name, "msi_irqs") == 0) contents.hasMsi = true;
+    NoteProductFolder(name, &contents.products);
+  }
+  return contents;
+}
+
+// Reads an attribute, which the kernel hands out whole in one read; false where it is not there.
+bool ReadAttribute(int function, const char *name, char *text, size_t size) {
+  Descriptor file;
+  if (OpenBelow(function, name, O_RDONLY, &file) != KIF_STATUS_OK) return false;
+  const ssize_t got = read(file.fd(), text, size - 1);
+  text[got > 0 ? got : 0] = '\0';
+  return got > 0;
+}
+
+// An attribute that holds one number, "0x8086".
 bool ReadHexAttribute(int function, const char *name, uint32_t *number) {
   char text[32];
-  if (ReadBelow(function, name, text, sizeof(text)) != KIF_STATUS_OK) return false;
+  if (!ReadAttribute(function, name, text, sizeof(text))) return false;
   text[strcspn(text, "\n")] = '\0';
   const char *place = text;
   if (place[0] == '0' && place[1] == 'x') place += 2;
@@ -87,48 +114,43 @@ bool ReadHexAttribute(int function, const char *name, uint32_t *number) {
 
 bool IsAsleep(int function) {
   char state[16];
-  if (ReadBelow(function, "power_state", state, sizeof(state)) != KIF_STATUS_OK) return false;
+  if (!ReadAttribute(function, "power_state", state, sizeof(state))) return false;
   return strncmp(state, "D3hot", 5) == 0 || strncmp(state, "D3cold", 6) == 0;
 }
 
-// One value of `uevent`, the numbers before and behind its colon: "PCI_ID=8086:1237".
-bool TakePair(const char *uevent, const char *key, uint16_t *first, uint16_t *second) {
-  const char *place = strstr(uevent, key);
-  if (place == nullptr) return false;
-  place += strlen(key);
+// The value of a line of `uevent`, "PCI_ID=8086:1237", or null.
+const char *FindValue(const char *event, const char *key) {
+  const size_t length = strlen(key);
+  while (*event != '\0' && strncmp(event, key, length) != 0) {
+    event += strcspn(event, "\n");
+    if (*event == '\n') ++event;
+  }
+  return *event != '\0' ? event + length : nullptr;
+}
+
+bool TakePair(const char *event, const char *key, uint16_t *first, uint16_t *second) {
+  const char *place = FindValue(event, key);
   uint32_t numbers[2];
-  if (!TakeHex(&place, ':', &numbers[0]) || !TakeHex(&place, '\n', &numbers[1])) return false;
+  if (place == nullptr || !TakeHex(&place, ':', &numbers[0]) ||
+      !TakeHex(&place, '\n', &numbers[1])) {
+    return false;
+  }
   *first = static_cast<uint16_t>(numbers[0]);
   *second = static_cast<uint16_t>(numbers[1]);
   return true;
 }
 
-bool TakeClass(const char *uevent, uint32_t *number) {
-  static constexpr char kKey[] = "PCI_CLASS=";
-  const char *place = strstr(uevent, kKey);
-  if (place == nullptr) return false;
-  place += sizeof(kKey) - 1;
-  return TakeHex(&place, '\n', number);
-}
-
-// What a function is, by its own account: the least that is known of it.
-void UseConfig(const ConfigSpace &config, PciConfigHeader *header) {
-  header->vendorID = config.vendor;
-  header->deviceID = config.device;
-  header->classCode = config.classCode;
-  if ((config.headerType & 0x7f) != kPlainFunction) return;
-  header->subVendorID = config.subVendor;
-  header->subDeviceID = config.subDevice;
-}
-
-// All that the attributes tell in one file. False where that is not so.
-bool UseEvent(int function, PciConfigHeader *header) {
+// Reads all that the attributes tell of a function in one file, and its driver. False where that
+// is not so.
+bool UseEvent(int function, PciConfigHeader *header, char (&driver)[kNameSize]) {
   char event[1024];
+  if (!ReadAttribute(function, "uevent", event, sizeof(event))) return false;
   uint16_t pairs[4];
   uint32_t classCode;
-  if (ReadBelow(function, "uevent", event, sizeof(event)) != KIF_STATUS_OK ||
+  const char *place = FindValue(event, "PCI_CLASS=");
+  if (place == nullptr || !TakeHex(&place, '\n', &classCode) ||
       !TakePair(event, "PCI_ID=", &pairs[0], &pairs[1]) ||
-      !TakePair(event, "PCI_SUBSYS_ID=", &pairs[2], &pairs[3]) || !TakeClass(event, &classCode)) {
+      !TakePair(event, "PCI_SUBSYS_ID=", &pairs[2], &pairs[3])) {
     return false;
   }
   header->vendorID = pairs[0];
@@ -136,10 +158,13 @@ bool UseEvent(int function, PciConfigHeader *header) {
   header->subVendorID = pairs[2];
   header->subDeviceID = pairs[3];
   header->classCode = static_cast<uint16_t>(classCode >> 8);
+  const char *name = FindValue(event, "DRIVER=");
+  CopyText(driver, sizeof(driver), name != nullptr ? name : "",
+           name != nullptr ? strcspn(name, "\n") : 0);
   return true;
 }
 
-// False where the attributes do not tell what the function is.
+// The same from one attribute at a time; false where they do not tell what the function is.
 bool UseAttributes(int function, PciConfigHeader *header) {
   uint32_t number;
   if (ReadHexAttribute(function, "subsystem_vendor", &number)) {
@@ -161,11 +186,21 @@ bool UseAttributes(int function, PciConfigHeader *header) {
   return true;
 }
 
+// What a function is, by its own account: the least that is known of it.
+void UseConfig(const ConfigSpace &config, PciConfigHeader *header) {
+  header->vendorID = config.vendor;
+  header->deviceID = config.device;
+  header->classCode = config.classCode;
+  if ((config.headerType & 0x7f) != kPlainFunction) return;
+  header->subVendorID = config.subVendor;
+  header->subDeviceID = config.subDevice;
+}
+
 // The kernel's number of the function's interrupt.
 uint8_t ReadIrq(int function) {
   constexpr uint8_t kNone = 255;
   char text[32];
-  if (ReadBelow(function, "irq", text, sizeof(text)) != KIF_STATUS_OK) return kNone;
+  if (!ReadAttribute(function, "irq", text, sizeof(text))) return kNone;
   const char *place = text;
   uint64_t number;
   if (!TakeNumber(&place, &number) || number == 0 || number >= kNone) return kNone;
@@ -184,13 +219,17 @@ uint64_t ReadFirstMsi(int function) {
   return lowest;
 }
 
+bool IsBridge(const ConfigSpace &config) {
+  const int type = config.headerType & 0x7f;
+  return type == kPciBridge || type == kCardBusBridge;
+}
+
 // The part of the header that only the function itself tells.
 void UseInterruptsAndBus(const ConfigSpace &config, bool hasMsi, PciConfigHeader *header) {
   header->isaIrq = config.interruptLine;
   header->intPin = static_cast<uint8_t>(config.interruptPin - 1);
   if (config.interruptPin != 0 || hasMsi) header->infoFlags |= kInterruptValid;
-  const int type = config.headerType & 0x7f;
-  if (type != kPciBridge && type != kCardBusBridge) return;
+  if (!IsBridge(config)) return;
   header->infoFlags |= kSpawnedBusValid;
   header->spawnedBus = config.secondaryBus;
 }
@@ -198,8 +237,8 @@ void UseInterruptsAndBus(const ConfigSpace &config, bool hasMsi, PciConfigHeader
 uint8_t MemberFlags(int function, uint16_t classCode, const char *driver) {
   uint8_t flags = 0;
   char text[8];
-  if (classCode >> 8 == kDisplayClass &&
-      ReadBelow(function, "boot_vga", text, sizeof(text)) == KIF_STATUS_OK && text[0] == '1') {
+  if (classCode >> 8 == kDisplayClass && ReadAttribute(function, "boot_vga", text, sizeof(text)) &&
+      text[0] == '1') {
     flags |= kBootConsole;
   }
   const bool forGuests = strcmp(driver, "vfio-pci") == 0 || strcmp(driver, "pci-stub") == 0 ||
@@ -208,83 +247,103 @@ uint8_t MemberFlags(int function, uint16_t classCode, const char *driver) {
   return flags;
 }
 
-// Reads `size` bytes of a function's configuration space. The kernel shows a reader without
-// privileges the standard header alone, and some functions have no extended space.
-KIF_Status ReadConfig(int function, char *bytes, size_t size) {
-  constexpr off_t kWithoutExtension = 256;
-  Descriptor file;
-  const KIF_Status status = OpenBelow(function, "config", O_RDONLY, &file);
-  if (status != KIF_STATUS_OK) return status;
-  struct stat facts;
-  if (fstat(file.fd(), &facts) != 0) return StatusOfErrno(errno);
-  if (facts.st_size == kWithoutExtension && size > kWithoutExtension) return KIF_STATUS_NOT_FOUND;
-  size_t filled = 0;
-  while (filled < size) {
-    const ssize_t got = pread(file.fd(), bytes + filled, size - filled, static_cast<off_t>(filled));
+// Reads up to `size` bytes of a configuration space; `*given` is how many there are to be seen.
+KIF_Status ReadConfig(int config, size_t offset, void *bytes, size_t size, size_t *given) {
+  *given = 0;
+  while (*given < size) {
+    const ssize_t got = pread(config, static_cast<char *>(bytes) + *given, size - *given,
+                              static_cast<off_t>(offset + *given));
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return StatusOfErrno(errno);
     if (got == 0) break;
-    filled += static_cast<size_t>(got);
+    *given += static_cast<size_t>(got);
   }
-  if (filled == size) return KIF_STATUS_OK;
-  return filled < kWithoutExtension ? KIF_STATUS_NO_PERMISSION : KIF_STATUS_NOT_FOUND;
-}
-
-// Reads the standard header of a function that is awake. Reading it of one that sleeps would wake
-// it, which can take more than a second; one that does not answer shows nothing but ones.
-KIF_Status ReadHeader(int function, ConfigSpace *config) {
-  if (IsAsleep(function)) return KIF_STATUS_NOT_FOUND;
-  const KIF_Status status = ReadConfig(function, reinterpret_cast<char *>(config), sizeof(*config));
-  if (status != KIF_STATUS_OK) return status;
-  return config->headerType != 0xff ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
-}
-
-// Fills in what does not need the standard header. `*msi` is the first MSI of the function, 0:
-// none.
-KIF_Status DescribeFunction(const PciFunction &function, PciConfigHeader *header, uint64_t *msi) {
-  const int folder = function.folder.fd();
-  PciDriver driver;
-  ReadPciDriver(function.devices.fd(), function.name, &driver);
-  uint32_t module;
-  KIF_Status status = FindModule(driver, &module);
-  if (status != KIF_STATUS_OK) return status;
-  int32_t slot;
-  status = FindPhysicalSlot(function.address, &slot);
-  if (status != KIF_STATUS_OK) return status;
-
-  header->irq = ReadIrq(folder);
-  *msi = ReadFirstMsi(folder);
-  header->vector = static_cast<uint8_t>(*msi);
-  header->mFlags = MemberFlags(folder, header->classCode, driver.name);
-  header->moduleID = module;
-  header->physSlot = slot;
-  const bool makesNothing = driver.name[0] == '\0' || header->classCode >> 8 == kBridgeClass;
-  if (!makesNothing) CopyDriverProduct(folder, header->name, sizeof(header->name));
   return KIF_STATUS_OK;
+}
+
+bool ReadConfigPart(int config, size_t offset, size_t size, ConfigSpace *space) {
+  size_t given;
+  return ReadConfig(config, offset, reinterpret_cast<char *>(space) + offset, size, &given) ==
+             KIF_STATUS_OK &&
+         given == size;
+}
+
+// Reads the standard header of a function, false where it cannot be seen: reading wakes a function
+// that sleeps, which can take more than a second, and one that does not answer shows nothing but
+// ones. Each four bytes are a round trip to the bus, so where the function is `known` from its
+// attributes only what they don't tell is read.
+bool ReadStandardHeader(int function, bool known, ConfigSpace *space) {
+  Descriptor file;
+  if (IsAsleep(function) || OpenBelow(function, "config", O_RDONLY, &file) != KIF_STATUS_OK) {
+    return false;
+  }
+  const int config = file.fd();
+  if (!known) return ReadConfigPart(config, 0, sizeof(*space), space) && space->headerType != 0xff;
+  constexpr size_t kWord = 4;
+  constexpr size_t kTypeWord = offsetof(ConfigSpace, headerType) / kWord * kWord;
+  constexpr size_t kBusWord = offsetof(ConfigSpace, secondaryBus) / kWord * kWord;
+  constexpr size_t kInterruptWord = offsetof(ConfigSpace, interruptLine);
+  return ReadConfigPart(config, kTypeWord, kWord, space) && space->headerType != 0xff &&
+         ReadConfigPart(config, kInterruptWord, kWord, space) &&
+         (!IsBridge(*space) || ReadConfigPart(config, kBusWord, kWord, space));
 }
 
 }  // namespace
 
 KIF_Status GetPciConfigHeader(const NodeInfo &, const KIF_ParamList *instance, void *record) {
-  PciFunction function;
-  KIF_Status status = OpenPciFunction(instance, &function);
+  PciAddress address;
+  DirectoryReader folder;
+  KIF_Status status = OpenPciFunction(instance, &address, &folder);
   if (status != KIF_STATUS_OK) return status;
+  const int function = folder.fd();
+  const FolderContents contents = LookAround(&folder);
+
   auto *header = static_cast<PciConfigHeader *>(record);
-  const int folder = function.folder.fd();
+  char driver[kNameSize] = "";
   ConfigSpace config = {};
-  const KIF_Status configStatus = ReadHeader(folder, &config);
-  const bool awake = configStatus == KIF_STATUS_OK;
-  if (awake) UseConfig(config, header);
-  if (!UseEvent(folder, header) && !UseAttributes(folder, header) && !awake) return configStatus;
-  uint64_t msi;
-  status = DescribeFunction(function, header, &msi);
-  if (status == KIF_STATUS_OK && awake) UseInterruptsAndBus(config, msi != 0, header);
-  return status;
+  const bool hasEvent = UseEvent(function, header, driver);
+  const bool isSeen = ReadStandardHeader(function, hasEvent, &config);
+  if (!hasEvent && isSeen) UseConfig(config, header);
+  const bool isKnown = hasEvent || UseAttributes(function, header) || isSeen;
+  if (!isKnown) return KIF_STATUS_NOT_FOUND;
+  if (contents.hasDriver && driver[0] == '\0') {
+    CopyLinkName(function, "driver", driver, sizeof(driver));
+  }
+
+  uint32_t module;
+  int32_t slot;
+  status = FindModule(driver, &module);
+  if (status == KIF_STATUS_OK) status = FindPhysicalSlot(address, &slot);
+  if (status != KIF_STATUS_OK) return status;
+  const uint64_t msi = contents.hasMsi ? ReadFirstMsi(function) : 0;
+  if (isSeen) UseInterruptsAndBus(config, msi != 0, header);
+  header->irq = ReadIrq(function);
+  header->vector = static_cast<uint8_t>(msi);
+  header->mFlags = MemberFlags(function, header->classCode, driver);
+  header->moduleID = module;
+  header->physSlot = slot;
+  if (driver[0] != '\0') {
+    CopyDriverProduct(function, contents.products, header->name, sizeof(header->name));
+  }
+  return KIF_STATUS_OK;
 }
 
+// The kernel shows a reader without privileges the standard header alone, and some functions have
+// no extended space.
 KIF_Status GetPciConfigSpace(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
-  PciFunction function;
-  const KIF_Status status = OpenPciFunction(instance, &function);
+  constexpr uint32_t kWithoutExtension = 256;
+  PciAddress address;
+  DirectoryReader folder;
+  Descriptor file;
+  struct stat facts;
+  KIF_Status status = OpenPciFunction(instance, &address, &folder);
+  if (status == KIF_STATUS_OK) status = OpenBelow(folder.fd(), "config", O_RDONLY, &file);
   if (status != KIF_STATUS_OK) return status;
-  return ReadConfig(function.folder.fd(), static_cast<char *>(record), node.offers.recordSize);
+  if (fstat(file.fd(), &facts) != 0) return StatusOfErrno(errno);
+  const uint32_t size = node.offers.recordSize;
+  if (facts.st_size == kWithoutExtension && size > kWithoutExtension) return KIF_STATUS_NOT_FOUND;
+  size_t given;
+  status = ReadConfig(file.fd(), 0, record, size, &given);
+  if (status != KIF_STATUS_OK || given == size) return status;
+  return given < kWithoutExtension ? KIF_STATUS_NO_PERMISSION : KIF_STATUS_NOT_FOUND;
 }

@@ -128,18 +128,6 @@ KIF_Status ListLevel(uint32_t level, const KIF_ParamList *parent, KIF_ParamList 
   return known ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
 }
 
-bool FormatAddress(const KIF_ParamList *instance, PciFunction *function) {
-  uint32_t *part = function->address.part;
-  for (uint32_t i = 0; i < 4; ++i) {
-    int64_t number;
-    if (!IntegerAt(instance, i, &number) || number < 0 || number > UINT32_MAX) return false;
-    part[i] = static_cast<uint32_t>(number);
-  }
-  const int length = snprintf(function->name, sizeof(function->name), "%04x:%02x:%02x.%x", part[0],
-                              part[1], part[2], part[3]);
-  return length > 0 && static_cast<size_t>(length) < sizeof(function->name);
-}
-
 }  // namespace
 
 bool TakeHex(const char **text, char end, uint32_t *number) {
@@ -157,11 +145,19 @@ bool TakeHex(const char **text, char end, uint32_t *number) {
   return true;
 }
 
-KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciFunction *function) {
-  if (!FormatAddress(instance, function)) return KIF_STATUS_NOT_FOUND;
-  const KIF_Status status = OpenHostFile(kDevices, O_PATH | O_DIRECTORY, &function->devices);
-  if (status != KIF_STATUS_OK) return status;
-  return OpenBelow(function->devices.fd(), function->name, O_PATH | O_DIRECTORY, &function->folder);
+KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciAddress *address,
+                           DirectoryReader *folder) {
+  uint32_t *part = address->part;
+  for (uint32_t i = 0; i < 4; ++i) {
+    int64_t number;
+    if (!IntegerAt(instance, i, &number)) return KIF_STATUS_BAD_PARAMETER;
+    if (number < 0 || number > UINT32_MAX) return KIF_STATUS_NOT_FOUND;
+    part[i] = static_cast<uint32_t>(number);
+  }
+  char path[sizeof(kDevices) + 40];
+  snprintf(path, sizeof(path), "%s/%04x:%02x:%02x.%x", kDevices, part[0], part[1], part[2],
+           part[3]);
+  return folder->Open(path);
 }
 
 KIF_Status FindPhysicalSlot(const PciAddress &address, int32_t *number) {

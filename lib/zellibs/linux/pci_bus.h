@@ -11,16 +11,10 @@ struct PciAddress {
   uint32_t part[4];  // segment, bus, slot and function
 };
 
-// A function and its folder in /sys/bus/pci/devices.
-struct PciFunction {
-  PciAddress address;
-  char name[32];  // "0000:00:1f.2"
-  Descriptor devices;
-  Descriptor folder;
-};
-
-// Opens the function that `instance` selects.
-KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciFunction *function);
+// Opens the folder in /sys/bus/pci/devices of the function that `instance` selects, and tells the
+// function's address.
+KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciAddress *address,
+                           DirectoryReader *folder);
 
 // Number of the slot in the machine's case that holds the function; -1: none is known. The status
 // is that of reading the bus.

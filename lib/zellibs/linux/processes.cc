@@ -18,8 +18,9 @@
 
 namespace {
 
-// How much the picture shows; each level includes the ones before it.
-enum class Level : uint8_t { kNothing, kCartels, kProcesses, kThreads };
+// How much the picture shows; each level includes the ones before it: the processes that may be
+// cartels; those with their userspaces; all processes; all threads.
+enum class Level : uint8_t { kNothing, kCartels, kUserspaces, kProcesses, kThreads };
 
 struct ThreadPlace {
   int32_t id;
@@ -122,7 +123,7 @@ bool ParseStat(const char *text, size_t length, Stat *stat) {
 KIF_Status ReadStat(int directory, const char *path, Stat *stat) {
   char text[kStatSize];
   size_t length;
-  const KIF_Status status = ReadBelow(directory, path, text, sizeof(text), &length);
+  const KIF_Status status = ReadPieceBelow(directory, path, text, sizeof(text), &length);
   if (status != KIF_STATUS_OK) return status;
   return ParseStat(text, length, stat) ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
 }
@@ -247,25 +248,13 @@ KIF_Status AppendProcess(int32_t id, bool withThreads) {
   return withThreads && hasOthers ? AppendOtherThreads(place) : KIF_STATUS_OK;
 }
 
-// The command lines that were read while the cartels were listed serve the new picture too.
-void KeepCommandLines(const Array<Process> &before) {
-  const Process *old = before.begin();
-  for (Process &process : picture->processes) {
-    while (old != before.end() && old->id < process.id) ++old;
-    if (old != before.end() && old->id == process.id) process.commandLine = old->commandLine;
-  }
-}
-
 KIF_Status TakePicture(Level level) {
-  Array<Process> before;
-  if (picture->level == Level::kCartels) before.Swap(picture->processes);
   Array<int32_t> ids;
   KIF_Status status = BeginPicture(&ids);
   for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) {
     status = AppendProcess(ids[i], level == Level::kThreads);
   }
   if (status != KIF_STATUS_OK) return status;
-  KeepCommandLines(before);
   status =
       AssignUserspaces(picture->proc.fd(), picture->processes.begin(), picture->processes.size());
   if (status == KIF_STATUS_OK) picture->level = level;
@@ -324,17 +313,30 @@ KIF_Status PlaceOfThread(int64_t id, uint32_t *found) {
   return KIF_STATUS_OK;
 }
 
-// In a picture of cartels only, a process is read when it is asked for.
+// In a picture of cartels a process is read when it is asked for. One that has ended since counts
+// as a zombie.
 KIF_Status ReadMainThread(Process *process) {
   if (process->mainThread != kNoThread) return KIF_STATUS_OK;
   Stat stat;
-  const KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
+  KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
+  if (status == KIF_STATUS_OK && IsDead(stat.state)) status = KIF_STATUS_NOT_FOUND;
+  process->isZombie = status == KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
-  if (IsDead(stat.state)) return KIF_STATUS_NOT_FOUND;
   FillProcess(stat, process);
   process->mainThread = static_cast<uint32_t>(picture->threads.size());
   return AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
                       stat);
+}
+
+// Reads what the userspaces of a picture of cartels are worked out from.
+KIF_Status AddUserspaces() {
+  for (Process &process : picture->processes) {
+    const KIF_Status status = ReadMainThread(&process);
+    if (status == KIF_STATUS_NO_MEMORY || status == KIF_STATUS_NO_RESOURCES) return status;
+  }
+  picture->level = Level::kUserspaces;
+  return AssignUserspaces(picture->proc.fd(), picture->processes.begin(),
+                          picture->processes.size());
 }
 
 KIF_Status RefreshThread(Thread *thread) {
@@ -347,20 +349,23 @@ KIF_Status RefreshThread(Thread *thread) {
   return KIF_STATUS_OK;
 }
 
-// Finds the thread in the picture, or in one of more detail where this one cannot have it.
+KIF_Status LookUpCartel(Process *process, ThreadValue value, uint32_t *place) {
+  KIF_Status status = KIF_STATUS_OK;
+  if (value == ThreadValue::kInfo && picture->level == Level::kCartels) status = AddUserspaces();
+  if (status == KIF_STATUS_OK) status = ReadMainThread(process);
+  *place = process->mainThread;
+  return status;
+}
+
+// Finds the thread in the picture, or takes one of more detail where this one cannot have it.
 KIF_Status LookUpThread(int64_t id, ThreadValue value, uint32_t *place) {
-  if (picture->level == Level::kCartels) {
+  if (picture->level != Level::kNothing && picture->level < Level::kThreads) {
     Process *process = FindProcess(id);
-    if (process != nullptr && value != ThreadValue::kInfo) {
-      const KIF_Status status = ReadMainThread(process);
-      *place = process->mainThread;
-      return status;
+    if (process == nullptr) {
+      picture->level = Level::kNothing;
+    } else if (picture->level < Level::kProcesses) {
+      return LookUpCartel(process, value, place);
     }
-    const KIF_Status status = TakePicture(process != nullptr ? Level::kProcesses : Level::kThreads);
-    if (status != KIF_STATUS_OK) return status;
-  }
-  if (picture->level == Level::kProcesses && FindProcess(id) == nullptr) {
-    picture->level = Level::kNothing;
   }
   const KIF_Status status =
       NeedLevel(picture->level == Level::kNothing ? Level::kThreads : picture->level);
@@ -372,7 +377,7 @@ KIF_Status ReadCommandLineFile(int32_t id, char *text) {
   char raw[kCommandLineRead];
   size_t length;
   snprintf(path, sizeof(path), "%d/cmdline", id);
-  const KIF_Status status = ReadBelow(picture->proc.fd(), path, raw, sizeof(raw), &length);
+  const KIF_Status status = ReadPieceBelow(picture->proc.fd(), path, raw, sizeof(raw), &length);
   text[0] = '\0';
   if (status == KIF_STATUS_NOT_FOUND) return KIF_STATUS_NO_COMMAND_LINE;
   if (status != KIF_STATUS_OK) return status;
@@ -385,20 +390,36 @@ KIF_Status ReadCommandLineFile(int32_t id, char *text) {
   return KIF_STATUS_OK;
 }
 
-// A process with a command line is no kernel thread and no zombie; only the others are looked at
-// more closely.
+// Kernel threads and zombies have no memory and so no program: one look at a link tells, where the
+// reader may look.
+KIF_Status FindProgram(int32_t id) {
+  if (IsForeignRoot()) return KIF_STATUS_NO_PERMISSION;  // a tree need not hold the links
+  char path[kPathSize];
+  char program[2];
+  snprintf(path, sizeof(path), "%d/exe", id);
+  return ReadLinkBelow(picture->proc.fd(), path, program, sizeof(program));
+}
+
+// Fills what tells a kernel thread or zombie where its program may not be looked at.
+KIF_Status TellByStat(Process *process) {
+  Stat stat;
+  const KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
+  if (status == KIF_STATUS_OK) FillProcess(stat, process);
+  return status;
+}
+
 KIF_Status AppendCartel(int32_t id) {
   Process process = NewProcess(id);
   char text[kCommandLineSize];
+  const KIF_Status program = FindProgram(id);
+  if (program == KIF_STATUS_NOT_FOUND) return KIF_STATUS_OK;
   const KIF_Status read = ReadCommandLineFile(id, text);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
   if (read == KIF_STATUS_OK) {
     process.commandLine = static_cast<uint32_t>(picture->commandLines.size());
     if (!picture->commandLines.Append(text, strlen(text) + 1)) return KIF_STATUS_NO_MEMORY;
-  } else {
-    Stat stat;
-    if (ReadThreadStat(id, id, &stat) != KIF_STATUS_OK) return KIF_STATUS_OK;
-    FillProcess(stat, &process);
+  } else if (program != KIF_STATUS_OK) {
+    if (TellByStat(&process) != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
     if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
   }
   return picture->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
