@@ -9,6 +9,7 @@
 #include <cstring>
 
 #include "param_list.h"
+#include "printable/printable.h"
 #include "status.h"
 
 namespace {
@@ -40,8 +41,10 @@ class Line {
     if (length_ > kRoom - 1) length_ = kRoom - 1;
   }
 
-  // One write a line, so that the lines of several processes do not mix.
+  // One write a line, so that the lines of several processes do not mix; and a text with a line
+  // break in it makes no line of its own.
   void Write() {
+    printable::MaskControls(text_, length_);
     text_[length_] = '\n';
     if (write(descriptor, text_, length_ + 1) < 0) tracing = Tracing::kOff;
   }

@@ -175,15 +175,15 @@ TEST_F(MduTest, ComparesTheFirst31CharactersOfAName) {
   Expect({"-s"}, "For '.':\n" + Bucket("ramdisk " + name, "3", 2));
 }
 
-TEST_F(MduTest, WidensItsSums) {
+TEST_F(MduTest, WrapsItsSums) {
   Describe("", "flags=0 size=0 ramdisk=\"tmp\"");
   AddFile("x", "flags=0 size=4294967295 ramdisk=\"tmp\"");
   Expect({}, "For './x':\n" + Bucket("ramdisk tmp", "-1") + "For '.':\n" +
                  Bucket("ramdisk tmp", "-1", 2));
   AddFile("y", "flags=0 size=1073741825 ramdisk=\"tmp\"");
-  Expect({"-s"}, "For '.':\n" + Bucket("ramdisk tmp", "5368709120", 3));
+  Expect({"-s"}, "For '.':\n" + Bucket("ramdisk tmp", "1073741824", 3));
   EXPECT_EQ(Walk({"-sh"}).out,
-            "For '.':\n                           ramdisk tmp: 5120M\t\t(    3 inodes)\n");
+            "For '.':\n                           ramdisk tmp: 1024M\t\t(    3 inodes)\n");
 }
 
 TEST_F(MduTest, GoesOnPastWhatCannotBeRead) {
@@ -278,7 +278,7 @@ TEST_F(MduTest, ListsUnlinkedFiles) {
   EXPECT_EQ(outcome.out,
             "Unlinked files:\n                                  gone:    1K\n"
             "                                 100%s: 4095M\n"
-            "Total unlinked files: 2\nSize of unlinked files:  4096M\n");
+            "Total unlinked files: 2\nSize of unlinked files:  1K\n");
 }
 
 TEST_F(MduTest, SaysHowTheUnlinkedReportEnded) {

@@ -1,7 +1,6 @@
 // mdu: how much of the in-memory root file system a tree uses, by the volume that holds each file;
 // or which files nothing leads to any more.
 #include <dirent.h>
-#include <inttypes.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
@@ -31,9 +30,10 @@ struct FreeDeleter {
 enum VolumeKind : uint32_t { kTardisk = 0, kRamdisk = 1 };
 constexpr const char *kKindNames[] = {"tardisk", "ramdisk"};
 
+// The sums are kept, and wrap, in 32 bits.
 struct DustatsBucket {
-  uint64_t inodes;
-  uint64_t bytes;
+  uint32_t inodes;
+  uint32_t bytes;
   uint32_t kind;  // VolumeKind
   char name[32];
 };
@@ -103,15 +103,13 @@ bool ParseOptions(int argc, char **argv, Options *options) {
   return argc - optind <= 1;
 }
 
-void PrintSize(const Options &options, uint64_t bytes) {
+void PrintSize(const Options &options, uint32_t bytes) {
   if (options.humanReadable) {
     char text[16];
     FormatSize(bytes, text, sizeof(text));
     printf("%5s", text);
-  } else if (bytes <= UINT32_MAX) {
-    printf("%12d", static_cast<int32_t>(bytes));
   } else {
-    printf("%12" PRIu64, bytes);
+    printf("%12d", static_cast<int32_t>(bytes));
   }
 }
 
@@ -132,7 +130,7 @@ void DustatsPrint(const Options &options, const char *path, const DustatsBucket 
     snprintf(volume, sizeof(volume), "%s %s", kKindNames[buckets[i].kind], buckets[i].name);
     printf("%38s: ", Shown(volume).text());
     PrintSize(options, buckets[i].bytes);
-    if (isDirectory) printf("\t\t(%5" PRIu64 " inodes)", buckets[i].inodes);
+    if (isDirectory) printf("\t\t(%5d inodes)", static_cast<int32_t>(buckets[i].inodes));
     putchar('\n');
   }
 }
@@ -352,7 +350,8 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
   printf("Total unlinked files: %zu\n", total.files);
   char bytes[24];
   if (options.humanReadable) {
-    FormatSize(total.bytes, bytes, sizeof(bytes));
+    // Only the figure in bytes has room for more than 32 bits.
+    FormatSize(static_cast<uint32_t>(total.bytes), bytes, sizeof(bytes));
   } else {
     snprintf(bytes, sizeof(bytes), "%zu", total.bytes);
   }

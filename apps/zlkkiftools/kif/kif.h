@@ -70,13 +70,13 @@ class AppendedInt {
 };
 
 // A walk over the entries of an instance list. Each step takes the parameter of the step before
-// off the selecting list and appends a copy of the next entry; what is appended is taken off when
-// the walk ends, however it ends. Both lists must outlive the walk.
+// off the selecting list and appends a copy of the next entry; the step that finds no entry leaves
+// the list as it was before the walk. A walk left earlier leaves its entry on the list, which is
+// then of no more use. Both lists must outlive the walk.
 class InstanceWalk {
  public:
   InstanceWalk(KIF_ParamList *instances, KIF_ParamList *selector)
       : instances_(instances), selector_(selector), count_(KIF_ParamListUsedCount(instances)) {}
-  ~InstanceWalk() { TakeOff(); }
   InstanceWalk(const InstanceWalk &) = delete;
   InstanceWalk &operator=(const InstanceWalk &) = delete;
 

@@ -128,10 +128,10 @@ bool CreateFile(const TableBuffer &record, SignatureCounter *counter, OutputFile
 }
 
 // Writes the buffer number `number` of the table that `table` selects; number 0 creates the file.
+// A failure ends the run, so `table` is put back on success alone.
 bool DumpBuffer(KIF_ParamList *table, int32_t number, SignatureCounter *counter, OutputFile *file) {
   static TableBuffer record;
-  const AppendedInt appended(table, number);
-  if (appended.status() != 0) return false;
+  if (KIF_ParamListAddInt(table, number) != 0) return false;
   if (ReadRecord(KIF_NODE_hardware_acpi_tables_buffers, table, &record) != 0) return false;
   FieldText(record.signature);
   if (record.length > sizeof(record.data)) {
@@ -139,13 +139,14 @@ bool DumpBuffer(KIF_ParamList *table, int32_t number, SignatureCounter *counter,
     return false;
   }
   if (number == 0 && !CreateFile(record, counter, file)) return false;
-  return file->Write(record.data, record.length) || FailWithErrno();
+  if (!file->Write(record.data, record.length)) return FailWithErrno();
+  KIF_ParamListRemoveLastParam(table);
+  return true;
 }
 
-// Dumps the table `value`; `selector` is the list that selects it.
+// Dumps the table `value`; `selector` is the list that selects it, put back on success alone.
 bool DumpTable(int32_t value, KIF_ParamList *selector, SignatureCounter *counter) {
-  const AppendedInt appended(selector, value);
-  if (appended.status() != 0) return false;
+  if (KIF_ParamListAddInt(selector, value) != 0) return false;
   ParamListHandle buffers;
   if (GetInstanceList(KIF_NODE_hardware_acpi_tables_buffers, selector, &buffers) != 0) {
     return false;
@@ -155,7 +156,9 @@ bool DumpTable(int32_t value, KIF_ParamList *selector, SignatureCounter *counter
   for (int32_t number = 0; number < count; ++number) {
     if (!DumpBuffer(selector, number, counter, &file)) return false;
   }
-  return file.Close() || FailWithErrno();
+  if (!file.Close()) return FailWithErrno();
+  KIF_ParamListRemoveLastParam(selector);
+  return true;
 }
 
 }  // namespace

@@ -84,7 +84,7 @@ bool TakeSigned(const char **text, int32_t *value) {
   if (negative) ++*text;
   uint64_t number;
   if (!TakeNumber(text, &number)) return false;
-  *value = negative ? -static_cast<int32_t>(number) : static_cast<int32_t>(number);
+  *value = static_cast<int32_t>(negative ? 0 - number : number);
   return true;
 }
 
