@@ -32,7 +32,7 @@ int CloseOutput(int status) {
   const bool failed = fflush(stdout) != 0;
   if (!failedBefore && !failed) return status;
   if (errno != EPIPE) Warning("zlkkiftools: write error: %s\n", strerror(errno));
-  return status == 0 ? 1 : status;
+  return (status & 0xff) == 0 ? 1 : status;  // the system keeps eight bits
 }
 
 Shown::Shown(const char *text, FILE *stream) : text_(text) {
