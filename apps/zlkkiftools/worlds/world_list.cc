@@ -41,7 +41,7 @@ void RegisterRoot(WorldRecord *record, UserspaceTable *table) {
 
 bool BuildInventory(WorldInventory *inventory, UserspaceTable *table) {
   const size_t count = inventory->worldCount + inventory->zombieCount;
-  inventory->all.reset(static_cast<WorldRecord **>(calloc(count + 1, sizeof(WorldRecord *))));
+  inventory->all.reset(static_cast<WorldRecord **>(calloc(count + 1, sizeof(void *))));
   if (inventory->all == nullptr) {
     fputs("WorldList: malloc failed when allocating allNodes list\n", stderr);
     return false;

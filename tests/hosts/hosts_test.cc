@@ -1,0 +1,166 @@
+// Every tool on the recorded machines beside this file: NAME.txt is a machine in the text form,
+// NAME.expected what the tools say of it. docs/machines.md tells how both are renewed.
+#include <algorithm>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+
+#include "host_fixture.h"
+
+namespace {
+
+constexpr char kFolder[] = SOURCE_DIR "/tests/hosts/";
+
+// The names of devices are left to the machines in tests/vm: the database of names changes.
+constexpr const char *kCommands[] = {
+    "zelvar -vl",
+    "uptime",
+    "hwclock",
+    "bootOption -afip",
+    "bootOption -rko",
+    "bootOption -mb",
+    "bootOption -C",
+    "irqinfo",
+    "lspci -p",
+    "lspci -nd",
+    "lspci -ne",
+    "pci-info -b0 -s1 -f0 -iS",
+    "pci-info -b0 -s31 -f7 -i",
+    "ps",
+    "ps -CgjPTtZ",
+    "ps -uvscU",
+    "ps -zU2",
+    "ps -Jtsn",
+    "ps -JNi",
+    "pidof sleep",
+    "pidof -s -o 1 sleep",
+    "pgrep -l .",
+    "pgrep -fv ^s",
+    "userspaceof 1",
+    "lsof",
+    "mdf",
+    "mdf -hp",
+    "mdu",
+    "pkill sleep",
+    "amldump",
+};
+
+std::vector<std::string> Words(const std::string &text) {
+  std::istringstream stream(text);
+  std::vector<std::string> words;
+  for (std::string word; stream >> word;) words.push_back(word);
+  return words;
+}
+
+// Control characters as \xHH, so that the files are shown and compared like any text.
+std::string Readable(const std::string &text) {
+  std::string readable;
+  for (const char c : text) {
+    char escape[5] = {c};
+    const bool control = static_cast<unsigned char>(c) < ' ' || c == '\x7f';
+    if (control && c != '\n' && c != '\t') snprintf(escape, sizeof(escape), "\\x%02x", c);
+    readable += escape;
+  }
+  if (!readable.empty() && readable.back() != '\n') readable += "\\\n";
+  return readable;
+}
+
+// A line for each file: its name, its size, and a sum of its bytes (FNV-1a).
+std::string FilesIn(const std::string &directory) {
+  std::vector<std::string> lines;
+  for (const auto &entry : std::filesystem::directory_iterator(directory)) {
+    std::ifstream file(entry.path(), std::ios::binary);
+    uint64_t sum = 0xcbf29ce484222325;
+    for (char c; file.get(c);) sum = (sum ^ static_cast<unsigned char>(c)) * 0x100000001b3;
+    char text[64];
+    snprintf(text, sizeof(text), " %ju bytes %016jx\n", uintmax_t{entry.file_size()},
+             uintmax_t{sum});
+    lines.push_back(entry.path().filename().string() + text);
+  }
+  std::sort(lines.begin(), lines.end());
+  std::string text;
+  for (const std::string &line : lines) text += "> " + line;
+  return text;
+}
+
+class HostsTest : public HostTest, public testing::WithParamInterface<std::string> {
+ protected:
+  // What all commands say of the host in a cache file, as the expected text has it.
+  std::string Transcript(const std::string &file) {
+    std::string transcript;
+    for (const std::string command : kCommands) {
+      std::vector<std::string> words = Words(command);
+      words.insert(words.begin(), {BIN_DIR "/zlkkiftools", "-c", file});
+      const std::string directory = Scratch() + "/files";
+      std::filesystem::create_directory(directory);
+      Outcome outcome = Run(words, {.environment = {"ZELLIBS_HOST=none"}, .directory = directory});
+      if (command == "uptime") outcome.out.replace(1, 8, "HH:MM:SS");
+      transcript += "$ " + command + "\n" + Readable(outcome.out);
+      std::istringstream messages(outcome.err);
+      for (std::string line; std::getline(messages, line);) transcript += "! " + line + "\n";
+      if (outcome.status != 0) transcript += "[" + std::to_string(outcome.status) + "]\n";
+      transcript += FilesIn(directory) + "\n";
+      std::filesystem::remove_all(directory);
+    }
+    return transcript;
+  }
+};
+
+// Gives the first line that differs too, since the texts are long.
+std::string FirstDifference(const std::string &left, const std::string &right) {
+  std::istringstream lefts(left), rights(right);
+  std::string command;
+  while (true) {
+    std::string one, other;
+    const bool both = std::getline(lefts, one) && std::getline(rights, other);
+    if (one.starts_with("$ ")) command = one;
+    if (!both || one != other) return command + "\n" + one + "\n" + other;
+  }
+}
+
+TEST_P(HostsTest, SaysWhatItSaid) {
+  const std::string expectedFile = kFolder + GetParam() + ".expected";
+  const std::string transcript = Transcript(Record(ReadFile(kFolder + GetParam() + ".txt")));
+  if (getenv("RENEW_HOSTS") != nullptr) {
+    std::ofstream(expectedFile, std::ios::binary) << transcript;
+    return;
+  }
+  const std::string expected = ReadFile(expectedFile);
+  EXPECT_TRUE(transcript == expected) << FirstDifference(transcript, expected);
+}
+
+// A machine served live says the same as its cache file, and more.
+TEST_P(HostsTest, ServesBootOptionFiles) {
+  const std::string file = Record(ReadFile(kFolder + GetParam() + ".txt"));
+  const Surroundings live = {.environment = {"ZELLIBS_HOST=" + file}};
+  const std::string names = Run({BIN_DIR "/zlkkiftools", "bootOption", "-rb"}, live).out;
+  for (const std::string &name : Words(names)) {
+    const Outcome outcome = Run({BIN_DIR "/zlkkiftools", "bootOption", "-rc", name}, live);
+    EXPECT_EQ(outcome.status, 0) << name;
+    EXPECT_EQ(outcome.out, "…\n") << name;  // redacted
+  }
+}
+
+// The same file comes out of the text and back.
+TEST_P(HostsTest, TextAndFileAreOne) {
+  const std::string text = ReadFile(kFolder + GetParam() + ".txt");
+  EXPECT_TRUE(Run({BIN_DIR "/kifcache", "dump", Record(text)}).out == text);
+}
+
+std::vector<std::string> Hosts() {
+  std::vector<std::string> names;
+  for (const auto &entry : std::filesystem::directory_iterator(kFolder)) {
+    if (entry.path().extension() == ".txt") names.push_back(entry.path().stem());
+  }
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+INSTANTIATE_TEST_SUITE_P(Machines, HostsTest, testing::ValuesIn(Hosts()), [](const auto &host) {
+  std::string name = host.param;
+  std::replace(name.begin(), name.end(), '-', '_');
+  return name;
+});
+
+}  // namespace
