@@ -9,6 +9,7 @@
 
 #include <memory>
 
+#include "free_deleter.h"
 #include "fsstats/morelfs_records.h"
 #include "kif/kif.h"
 #include "kiftools.h"
@@ -22,10 +23,6 @@ constexpr dev_t kRootDevice = 1;  // the in-memory file system
 constexpr size_t kPathSize = 4096;
 constexpr size_t kLongestPath = kPathSize - 1;
 constexpr int kNoMemory = -12;
-
-struct FreeDeleter {
-  void operator()(void *memory) const { free(memory); }
-};
 
 enum VolumeKind : uint32_t { kTardisk = 0, kRamdisk = 1 };
 constexpr const char *kKindNames[] = {"tardisk", "ramdisk"};

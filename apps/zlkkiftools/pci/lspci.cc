@@ -6,6 +6,7 @@
 
 #include <memory>
 
+#include "free_deleter.h"
 #include "kif/kif.h"
 #include "output.h"
 #include "pci/pci_ids.h"
@@ -38,10 +39,6 @@ struct Options {
   bool details;
   bool dump;
   bool extendedDump;
-};
-
-struct FreeDeleter {
-  void operator()(void *memory) const { free(memory); }
 };
 
 struct ModuleName {

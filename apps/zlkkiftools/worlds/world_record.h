@@ -4,13 +4,10 @@
 
 #include <stddef.h>
 #include <stdint.h>
-#include <stdlib.h>
 
 #include <memory>
 
-struct FreeDeleter {
-  void operator()(void *memory) const { free(memory); }
-};
+#include "free_deleter.h"
 
 struct WorldRecord {
   uint64_t usedTime;  // in microseconds
