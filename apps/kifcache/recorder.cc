@@ -324,7 +324,9 @@ KIF_Status ReadContent(KIF_NodeId node, KIF_ParamList *selector, uint32_t total,
     if (status != 0) return status;
     const uint32_t given = std::min(output->length, wanted);
     if (given == 0) break;
-    bytes->append(static_cast<const char *>(KIFData_GetData(output.get())), given);
+    const void *read = KIFData_GetData(output.get());
+    if (read == nullptr) OutOfMemory();
+    bytes->append(static_cast<const char *>(read), given);
   }
   return 0;
 }

@@ -5,20 +5,9 @@
 
 #include "host_fixture.h"
 
-#if defined(__SANITIZE_ADDRESS__)
-#define MAY_FAIL_ALLOCATIONS 0
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-#define MAY_FAIL_ALLOCATIONS 0
-#endif
-#endif
-#ifndef MAY_FAIL_ALLOCATIONS
-#define MAY_FAIL_ALLOCATIONS 1
-#endif
-
 // The `call`-th call of `operation` that the program makes, from 1, fails: with `status` where it
 // gives one, else without a result. `operation` is one of the library's, or malloc, calloc or
-// realloc where MAY_FAIL_ALLOCATIONS is 1.
+// realloc; see fault_inject.cc.
 inline Surroundings Failing(const std::string &operation, int call,
                             const std::string &status = "0xbad0001") {
   Surroundings surroundings;

@@ -1,30 +1,26 @@
-// A preloaded library that makes one call of the program under test fail:
+// A preloaded library that makes calls of the program under test fail:
 //   FAIL_OPERATION=NAME   a library operation, or malloc, calloc, realloc
 //   FAIL_CALL=N           its N-th call that the program itself makes, from 1
+//   FAIL_FROM=1           and every one after it
 //   FAIL_STATUS=S         what an operation that gives a status answers (0xbad0001)
-// Calls from inside of libraries are not counted. In a build with the address sanitizer the
-// allocator is the sanitizer's and is left alone.
+//   FAIL_REPORT=FILE      an existing file of two 32-bit numbers, in which the calls and those of
+//                         them that failed are counted
+// Calls from inside of libraries are not counted. Two names stand for many: "operations" for every
+// library operation, "allocations" for every allocation, here from inside of libraries too. They
+// are counted from the beginning of main.
 #include <dlfcn.h>
 #include <elf.h>
 #include <errno.h>
+#include <fcntl.h>
 #include <link.h>
 #include <stdint.h>
 #include <stdlib.h>
 #include <string.h>
 #include <sys/auxv.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include "kif/zellibs.h"
-
-#if defined(__SANITIZE_ADDRESS__)
-#define OWN_ALLOCATOR 0
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-#define OWN_ALLOCATOR 0
-#endif
-#endif
-#ifndef OWN_ALLOCATOR
-#define OWN_ALLOCATOR 1
-#endif
 
 namespace {
 
@@ -52,11 +48,43 @@ uint32_t NumberFrom(const char *variable, uint32_t otherwise) {
   return text != nullptr ? static_cast<uint32_t>(strtoul(text, nullptr, 0)) : otherwise;
 }
 
-bool Fails(const char *operation, const void *caller, uint32_t *calls) {
-  if (!IsInProgram(caller)) return false;
+struct Report {
+  uint32_t calls;
+  uint32_t failed;
+};
+
+Report ownReport;
+Report *report = &ownReport;
+bool isInMain;
+
+enum class Kind { kOperation, kAllocation };
+
+bool IsFailing(const char *operation, Kind kind, const void *caller) {
   const char *failing = getenv("FAIL_OPERATION");
-  if (failing == nullptr || strcmp(failing, operation) != 0) return false;
-  return ++*calls == NumberFrom("FAIL_CALL", 1);
+  if (failing == nullptr) return false;
+  if (kind == Kind::kAllocation && strcmp(failing, "allocations") == 0) return isInMain;
+  if (!IsInProgram(caller)) return false;
+  if (kind == Kind::kOperation && strcmp(failing, "operations") == 0) return isInMain;
+  return strcmp(failing, operation) == 0;
+}
+
+bool Fails(const char *operation, Kind kind, const void *caller) {
+  if (!IsFailing(operation, kind, caller)) return false;
+  const uint32_t call = ++report->calls;
+  const uint32_t first = NumberFrom("FAIL_CALL", 1);
+  const bool goesOn = first != 0 && NumberFrom("FAIL_FROM", 0) != 0;
+  const bool fails = call == first || (goesOn && call > first);
+  if (fails) ++report->failed;
+  return fails;
+}
+
+void OpenReport() {
+  const char *path = getenv("FAIL_REPORT");
+  const int file = path != nullptr ? open(path, O_RDWR | O_CLOEXEC) : -1;
+  if (file == -1) return;
+  void *map = mmap(nullptr, sizeof(Report), PROT_READ | PROT_WRITE, MAP_SHARED, file, 0);
+  if (map != MAP_FAILED) report = static_cast<Report *>(map);
+  close(file);
 }
 
 KIF_Status FailStatus() {
@@ -70,11 +98,11 @@ Operation *Next(const char *name) {
 
 }  // namespace
 
-#define OPERATION(Result, name, failure, parameters, arguments)                          \
-  Result name parameters {                                                               \
-    static uint32_t calls;                                                               \
-    static auto *next = Next<decltype(name)>(#name);                                     \
-    return Fails(#name, __builtin_return_address(0), &calls) ? failure : next arguments; \
+#define OPERATION(Result, name, failure, parameters, arguments)                     \
+  Result name parameters {                                                          \
+    static auto *next = Next<decltype(name)>(#name);                                \
+    const bool fails = Fails(#name, Kind::kOperation, __builtin_return_address(0)); \
+    return fails ? failure : next arguments;                                        \
   }
 
 OPERATION(KIF_Status, KIF_Get, FailStatus(),
@@ -117,27 +145,47 @@ OPERATION(KIF_Status, KIF_CheckSig, FailStatus(),
           (char *kernelBuildDate, uint32_t size, const char **programBuildDate),
           (kernelBuildDate, size, programBuildDate))
 
-#if OWN_ALLOCATOR
+// dlsym() allocates, so the allocator is reached by its other names. With the address sanitizer it
+// is the sanitizer's.
+#if defined(__SANITIZE_ADDRESS__)
+#define ALLOCATOR(name) __interceptor_##name
+#else
+#define ALLOCATOR(name) __libc_##name
+#endif
 
-// dlsym() allocates, so the allocator is reached by its other names.
 extern "C" {
-void *__libc_malloc(size_t size);
-void *__libc_calloc(size_t count, size_t size);
-void *__libc_realloc(void *block, size_t size);
+void *ALLOCATOR(malloc)(size_t size);
+void *ALLOCATOR(calloc)(size_t count, size_t size);
+void *ALLOCATOR(realloc)(void *block, size_t size);
 
-#define ALLOCATION(name, parameters, arguments)               \
-  void *name parameters {                                     \
-    static uint32_t calls;                                    \
-    if (!Fails(#name, __builtin_return_address(0), &calls)) { \
-      return __libc_##name arguments;                         \
-    }                                                         \
-    errno = ENOMEM;                                           \
-    return nullptr;                                           \
+#define ALLOCATION(name, parameters, arguments)                          \
+  void *name parameters {                                                \
+    if (!Fails(#name, Kind::kAllocation, __builtin_return_address(0))) { \
+      return ALLOCATOR(name) arguments;                                  \
+    }                                                                    \
+    errno = ENOMEM;                                                      \
+    return nullptr;                                                      \
   }
 
 ALLOCATION(malloc, (size_t size) noexcept, (size))
 ALLOCATION(calloc, (size_t count, size_t size) noexcept, (count, size))
 ALLOCATION(realloc, (void *block, size_t size) noexcept, (block, size))
+
+using Main = int(int argc, char **argv, char **environment);
+static Main *programMain;
+
+static int CountedMain(int argc, char **argv, char **environment) {
+  OpenReport();
+  isInMain = true;
+  const int status = programMain(argc, argv, environment);
+  isInMain = false;
+  return status;
 }
 
-#endif
+int __libc_start_main(Main *main, int argc, char **argv, void (*init)(), void (*fini)(),
+                      void (*rtldFini)(), void *stackEnd) {
+  programMain = main;
+  static auto *next = Next<decltype(__libc_start_main)>("__libc_start_main");
+  return next(CountedMain, argc, argv, init, fini, rtldFini, stackEnd);
+}
+}

@@ -256,14 +256,13 @@ TEST_F(LspciTest, FailedCalls) {
     std::string message;
     bool listed;
   } cases[] = {
-    {"KIF_ParamListCreate", 1, "ListPCI: Not enough memory\n", false},
-    {"KIF_ParamListCreate", 2, "ListModules: Not enough memory\n", true},
-    {"KIF_ParamListAddInt", 1, append, false},
-    {"KIF_ParamListAddInt", 4, append, false},
-    {"KIF_ParamListAddInt", 5, append + "ListModules: error requesting module info - 0x0\n", true},
-#if MAY_FAIL_ALLOCATIONS
-    {"calloc", 4, "ListModules: Not enough memory\n", true},
-#endif
+      {"KIF_ParamListCreate", 1, "ListPCI: Not enough memory\n", false},
+      {"KIF_ParamListCreate", 2, "ListModules: Not enough memory\n", true},
+      {"KIF_ParamListAddInt", 1, append, false},
+      {"KIF_ParamListAddInt", 4, append, false},
+      {"KIF_ParamListAddInt", 5, append + "ListModules: error requesting module info - 0x0\n",
+       true},
+      {"calloc", 4, "ListModules: Not enough memory\n", true},
   };
   for (const auto &[operation, call, message, listed] : cases) {
     const Outcome outcome = Live(host, {"lspci", "-p"}, Failing(operation, call));

@@ -97,13 +97,11 @@ TEST_F(PgrepTest, EndsWithStatusThreeWhenItFails) {
     const char *out;
     const char *err;
   } cases[] = {
-    {"KIF_ParamListCreate", 1, "", ""},
-    {"KIF_GetInstanceListAlloc", 1, "", ""},
-    {"KIF_ParamListAddInt", 2, "10 \b\n", "Couldn't add param to list: 0xbad0062"},
-    {"KIF_ParamListGetInt32", 2, "10 \b\n", ""},
-#if MAY_FAIL_ALLOCATIONS
-    {"calloc", 1, "", ""},
-#endif
+      {"KIF_ParamListCreate", 1, "", ""},
+      {"KIF_GetInstanceListAlloc", 1, "", ""},
+      {"KIF_ParamListAddInt", 2, "10 \b\n", "Couldn't add param to list: 0xbad0062"},
+      {"KIF_ParamListGetInt32", 2, "10 \b\n", ""},
+      {"calloc", 1, "", ""},
   };
   for (const auto &row : cases) {
     const Outcome outcome =

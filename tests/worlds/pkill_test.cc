@@ -269,15 +269,13 @@ TEST_F(PkillTest, SaysWhatFails) {
     const char *err;
     bool first;  // whether the first cartel was signalled
   } cases[] = {
-    {"KIF_ParamListCreate", 1, "pkill: Out of memory\n", false},
-    {"KIF_GetInstanceListAlloc", 1, "pkill: No permission\n", false},
-    {"KIF_Get", 1, "pkill: No permission\n", false},
-    {"KIF_Get", 2, "pkill: No permission\n", true},
-    {"KIF_ParamListGetInt32", 1, "pkill: No permission\n", false},
-    {"KIF_ParamListAddInt", 2, "Couldn't add param to list: 0xbad000fpkill: Failure\n", true},
-#if MAY_FAIL_ALLOCATIONS
-    {"calloc", 1, "", false},
-#endif
+      {"KIF_ParamListCreate", 1, "pkill: Out of memory\n", false},
+      {"KIF_GetInstanceListAlloc", 1, "pkill: No permission\n", false},
+      {"KIF_Get", 1, "pkill: No permission\n", false},
+      {"KIF_Get", 2, "pkill: No permission\n", true},
+      {"KIF_ParamListGetInt32", 1, "pkill: No permission\n", false},
+      {"KIF_ParamListAddInt", 2, "Couldn't add param to list: 0xbad000fpkill: Failure\n", true},
+      {"calloc", 1, "", false},
   };
   for (const auto &row : cases) {
     const Outcome outcome = Pkill({"-USR2", "."}, Failing(row.operation, row.call, "0xbad000f"));

@@ -303,7 +303,7 @@ int ReportTree(const Options &options, const char *path) {
 
 struct UnlinkedTotal {
   size_t files = 0;
-  size_t bytes = 0;
+  uint64_t bytes = 0;
 };
 
 void CountUnlinked(const Options &options, InodeStats *stats, UnlinkedTotal *total) {
@@ -350,7 +350,7 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
     // Only the figure in bytes has room for more than 32 bits.
     FormatSize(static_cast<uint32_t>(total.bytes), bytes, sizeof(bytes));
   } else {
-    snprintf(bytes, sizeof(bytes), "%zu", total.bytes);
+    snprintf(bytes, sizeof(bytes), "%llu", static_cast<unsigned long long>(total.bytes));
   }
   printf("Size of unlinked files:  %s\n", bytes);
   return status;
