@@ -45,8 +45,7 @@ KIF_Status GetMapping(const NodeInfo &node, const KIF_ParamList *instance, void 
 KIF_Status ListPciSegments(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status ListPciBuses(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status ListPciSlots(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
-KIF_Status ListPciFunctions(const NodeInfo &node, const KIF_ParamList *parent,
-                            KIF_ParamList *list);
+KIF_Status ListPciFunctions(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status GetPciConfigHeader(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetPciConfigSpace(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 
