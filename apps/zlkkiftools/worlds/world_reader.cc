@@ -55,11 +55,7 @@ Reading ReadSchedStats(KIF_ParamList *instance, SchedAffinity *affinity, WorldRe
   return Reading::kKept;
 }
 
-WorldRecord *AppendZombie(WorldInventory *inventory) {
-  return &inventory->zombies[inventory->zombieCount++];
-}
-
-// Makes room for `more` zombie records, so that appending them cannot fail.
+// Makes room for `more` zombie records, so that taking the next ones cannot fail.
 bool ReserveZombies(WorldInventory *inventory, size_t more) {
   if (more <= inventory->zombieCapacity - inventory->zombieCount) return true;
   size_t capacity = inventory->zombieCount + more;
@@ -139,7 +135,7 @@ bool CollectZombies(WorldInventory *inventory, WorldRecord *record) {
     ChildRecord child;
     if (!ReadChild(record->cartelID, childID, &child)) return false;
     if (child.childState != kChildStateZombie || record->worldID != record->cartelID) continue;
-    FillZombie(*record, childID, AppendZombie(inventory));
+    FillZombie(*record, childID, &inventory->zombies[inventory->zombieCount++]);
     ++record->zombieCount;
   }
   return true;

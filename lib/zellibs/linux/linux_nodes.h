@@ -18,9 +18,6 @@ KIF_Status GetNumPcpus(const NodeInfo &node, const KIF_ParamList *instance, void
 KIF_Status GetCpuInfo(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 
-// Number of CPUs online, and the number of the last one plus 1.
-KIF_Status CountOnlineCpus(uint32_t *online);
-
 // worlds.cc
 KIF_Status ListWorlds(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status GetWorldName(const NodeInfo &node, const KIF_ParamList *instance, void *record);

@@ -22,20 +22,6 @@ bool TakeHundredths(const char **text, uint32_t *hundredths) {
   return true;
 }
 
-}  // namespace
-
-// See proc(5), /proc/uptime: seconds with two decimals.
-KIF_Status GetUpTime(const NodeInfo &, const KIF_ParamList *, void *record) {
-  char text[64];
-  const KIF_Status status = ReadHostFile("/proc/uptime", text, sizeof(text));
-  if (status != KIF_STATUS_OK) return status;
-  const char *place = text;
-  uint64_t seconds;
-  if (!TakeNumber(&place, &seconds)) return KIF_STATUS_IO_ERROR;
-  PutNumber(record, 0, static_cast<uint32_t>(seconds));
-  return KIF_STATUS_OK;
-}
-
 // Documentation/admin-guide/cputopology.rst: a list of ranges, "0-3,8".
 KIF_Status CountOnlineCpus(uint32_t *online) {
   char text[4096];
@@ -57,18 +43,33 @@ KIF_Status CountOnlineCpus(uint32_t *online) {
   return *online > 0 ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
 }
 
-KIF_Status GetNumPcpus(const NodeInfo &, const KIF_ParamList *, void *record) {
+KIF_Status PutOnlineCpus(void *record, size_t offset) {
   uint32_t online;
   const KIF_Status status = CountOnlineCpus(&online);
-  if (status == KIF_STATUS_OK) PutNumber(record, 4, online);
+  if (status == KIF_STATUS_OK) PutNumber(record, offset, online);
   return status;
 }
 
+}  // namespace
+
+// See proc(5), /proc/uptime: seconds with two decimals.
+KIF_Status GetUpTime(const NodeInfo &, const KIF_ParamList *, void *record) {
+  char text[64];
+  const KIF_Status status = ReadHostFile("/proc/uptime", text, sizeof(text));
+  if (status != KIF_STATUS_OK) return status;
+  const char *place = text;
+  uint64_t seconds;
+  if (!TakeNumber(&place, &seconds)) return KIF_STATUS_IO_ERROR;
+  PutNumber(record, 0, static_cast<uint32_t>(seconds));
+  return KIF_STATUS_OK;
+}
+
+KIF_Status GetNumPcpus(const NodeInfo &, const KIF_ParamList *, void *record) {
+  return PutOnlineCpus(record, 4);
+}
+
 KIF_Status GetCpuInfo(const NodeInfo &, const KIF_ParamList *, void *record) {
-  uint32_t online;
-  const KIF_Status status = CountOnlineCpus(&online);
-  if (status == KIF_STATUS_OK) PutNumber(record, 16, online);
-  return status;
+  return PutOnlineCpus(record, 16);
 }
 
 // The whole machine is group 0; there are no others.
