@@ -21,8 +21,8 @@ bool IsAsked(const NodeInfo &node, const char *const *prefixes) {
   return false;
 }
 
-bool TakesParameters(const char *types, size_t count) {
-  return types != nullptr && strlen(types) == count;
+bool TakesParameters(const ParameterTypes &parameters, size_t count) {
+  return parameters.offered && strlen(parameters.types) == count;
 }
 
 void ReadContent(uint32_t number, KIF_ParamList *instance) {
@@ -42,10 +42,10 @@ void ReadContent(uint32_t number, KIF_ParamList *instance) {
 
 // Every text of a record ends within its field or fills it; the sanitizer sees the rest.
 void ReadAnswer(const NodeInfo &node, uint32_t number, KIF_ParamList *instance, size_t count) {
-  if (TakesParameters(node.offers.recordParameters, count)) {
+  if (TakesParameters(node.offers.record, count)) {
     KIF_Get(number, instance, record, node.offers.recordSize);
   }
-  if (TakesParameters(node.offers.contentParameters, count)) ReadContent(number, instance);
+  if (TakesParameters(node.offers.content, count)) ReadContent(number, instance);
 }
 
 void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t count);
@@ -70,7 +70,7 @@ void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t 
     const NodeInfo &node = kNodes[number - 1];
     if (!IsAsked(node, prefixes)) continue;
     ReadAnswer(node, number, selector, count);
-    if (count == kMostParameters || !TakesParameters(node.offers.listParameters, count)) continue;
+    if (count == kMostParameters || !TakesParameters(node.offers.list, count)) continue;
     KIF_ParamList *list = nullptr;
     if (KIF_GetInstanceListAlloc(number, selector, &list) != 0) continue;
     ReadBelow(prefixes, list, selector, count);

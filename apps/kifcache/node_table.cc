@@ -7,9 +7,9 @@
 namespace {
 
 // The parameters that select, as in "(integer, text)".
-std::string Parameters(const char *types) {
+std::string Parameters(const ParameterTypes &parameters) {
   std::string written = "(";
-  for (; *types != '\0'; ++types) {
+  for (const char *types = parameters.types; *types != '\0'; ++types) {
     if (written.size() > 1) written += ", ";
     written += *types == 'i' ? "integer" : "text";
   }
@@ -28,18 +28,18 @@ void PrintNodes(FILE *stream) {
   for (const NodeInfo &node : kNodes) {
     const NodeOffers &offers = node.offers;
     fprintf(stream, "%s\n", node.path);
-    if (offers.listParameters != nullptr) {
-      fprintf(stream, "  list %s\n", Parameters(offers.listParameters).c_str());
+    if (offers.list.offered) {
+      fprintf(stream, "  list %s\n", Parameters(offers.list).c_str());
     }
-    if (offers.recordParameters != nullptr) {
-      fprintf(stream, "  record %s: %u bytes\n", Parameters(offers.recordParameters).c_str(),
+    if (offers.record.offered) {
+      fprintf(stream, "  record %s: %u bytes\n", Parameters(offers.record).c_str(),
               offers.recordSize);
     }
-    if (offers.contentParameters != nullptr) {
-      fprintf(stream, "  content %s\n", Parameters(offers.contentParameters).c_str());
+    if (offers.content.offered) {
+      fprintf(stream, "  content %s\n", Parameters(offers.content).c_str());
     }
     if (offers.settable) fputs("  set\n", stream);
-    for (const NodeField *field = node.fields; field->name != nullptr; ++field) {
+    for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
       fprintf(stream, "  %6u  %s: %s\n", field->offset, field->name, Type(*field).c_str());
     }
   }

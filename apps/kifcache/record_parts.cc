@@ -27,7 +27,7 @@ std::vector<RecordPart> PartsOf(const NodeInfo *node, std::string_view record) {
     whole.resize(node->offers.recordSize);
   }
   std::string rest = whole;
-  const NodeField *field = node != nullptr ? node->fields : nullptr;
+  const NodeField *field = node != nullptr ? FieldsOf(*node) : nullptr;
   for (; field != nullptr && field->name != nullptr; ++field) {
     std::string bytes = whole.substr(field->offset, field->size);
     if (field->type == FieldType::kText) bytes.resize(strnlen(bytes.data(), bytes.size()));

@@ -62,7 +62,7 @@ NodeIndex ListAbove(const NodeInfo &node) {
   size_t longest = 0;
   for (const NodeInfo &candidate : kNodes) {
     const size_t length = strlen(candidate.path);
-    if (candidate.offers.listParameters != nullptr && length > longest &&
+    if (candidate.offers.list.offered && length > longest &&
         strncmp(node.path, candidate.path, length) == 0 && node.path[length] == '_') {
       longest = length;
       above = IndexOf(candidate);
@@ -74,7 +74,7 @@ NodeIndex ListAbove(const NodeInfo &node) {
 // The value of an unsigned field of a record.
 uint64_t FieldOf(const NodeInfo &node, const char *name, const std::string &record) {
   uint64_t value = 0;
-  for (const NodeField *field = node.fields; field->name != nullptr; ++field) {
+  for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
     if (strcmp(field->name, name) == 0) memcpy(&value, &record[field->offset], field->size);
   }
   return value;
@@ -82,7 +82,7 @@ uint64_t FieldOf(const NodeInfo &node, const char *name, const std::string &reco
 
 // Whether the records of two nodes have the same instances, so that they are read together.
 bool ShareInstances(const NodeInfo &left, const NodeInfo &right) {
-  return left.offers.listParameters == nullptr && right.offers.listParameters == nullptr &&
+  return !left.offers.list.offered && !right.offers.list.offered &&
          left.offers.instances == right.offers.instances && ListAbove(left) == ListAbove(right);
 }
 
@@ -135,9 +135,9 @@ void Recorder::Record() {
     const NodeInfo &node = kNodes[row];
     size_t end = row + 1;
     while (end < kNodeCount && ShareInstances(node, kNodes[end])) ++end;
-    if (node.offers.listParameters == nullptr) {
+    if (!node.offers.list.offered) {
       RecordTogether(row, end);
-    } else if (node.offers.recordParameters == nullptr) {
+    } else if (!node.offers.record.offered) {
       ListInstances(IndexOf(node));
     } else {
       RecordOwnLists(node);
@@ -210,11 +210,11 @@ const std::vector<Values> &Recorder::ListInstances(NodeIndex list) {
 const std::vector<Values> &Recorder::Parents(const NodeInfo &node) {
   static const std::vector<Values> top(1);
   const NodeOffers &offers = node.offers;
-  const char *parameters = offers.listParameters != nullptr     ? offers.listParameters
-                           : offers.recordParameters != nullptr ? offers.recordParameters
-                                                                : offers.contentParameters;
+  const ParameterTypes &parameters = offers.list.offered     ? offers.list
+                                     : offers.record.offered ? offers.record
+                                                             : offers.content;
   const NodeIndex above = ListAbove(node);
-  return parameters[0] == '\0' || above == kNodeCount ? top : ListInstances(above);
+  return parameters.types[0] == '\0' || above == kNodeCount ? top : ListInstances(above);
 }
 
 // A cartel's ID stands for its main world.
@@ -291,8 +291,8 @@ void Recorder::RecordAnswers(size_t first, size_t end, const Values &instance) {
   for (size_t row = first; row < end; ++row) {
     const NodeInfo &node = kNodes[row];
     if (!HasRoom(node)) continue;
-    if (node.offers.recordParameters != nullptr) RecordRecord(node, instance, selector.get());
-    if (node.offers.contentParameters != nullptr) RecordContent(node, instance, selector.get());
+    if (node.offers.record.offered) RecordRecord(node, instance, selector.get());
+    if (node.offers.content.offered) RecordContent(node, instance, selector.get());
   }
 }
 

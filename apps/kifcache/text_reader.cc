@@ -99,7 +99,7 @@ class Reader {
   bool ReadContent();
   bool ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasStatus);
   bool ReadSet();
-  bool ReadNode(const char *NodeOffers::*parameters, const char *what, const NodeInfo **node);
+  bool ReadNode(ParameterTypes NodeOffers::*parameters, const char *what, const NodeInfo **node);
   bool ReadSelector(const NodeInfo &node, const char *parameters, Values *values);
   bool ReadValue(Value *value);
   bool ReadPart(const NodeInfo &node, std::string *record);
@@ -226,12 +226,12 @@ bool Reader::ReadFact(std::string_view key) {
 }
 
 // Reads a node that has `what`; `parameters` is the member of its offers that says so.
-bool Reader::ReadNode(const char *NodeOffers::*parameters, const char *what,
+bool Reader::ReadNode(ParameterTypes NodeOffers::*parameters, const char *what,
                       const NodeInfo **node) {
   const std::string_view path = NextWord(false);
   *node = FindNodeByPath(path.data(), path.size());
   if (*node == nullptr) return Fail("no node is named \"%.*s\"", PRINTED(path));
-  if (parameters != nullptr && (*node)->offers.*parameters == nullptr) {
+  if (parameters != nullptr && !((*node)->offers.*parameters).offered) {
     return Fail("%s has no %s", (*node)->path, what);
   }
   return true;
@@ -320,8 +320,8 @@ bool Reader::ReadPlainText(std::string *text, const char *what) {
 
 bool Reader::ReadList() {
   const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::listParameters, "instance lists", &node)) return false;
-  if (!ReadSelector(*node, node->offers.listParameters, &values_)) return false;
+  if (!ReadNode(&NodeOffers::list, "instance lists", &node)) return false;
+  if (!ReadSelector(*node, node->offers.list.types, &values_)) return false;
   KIF_Status status = 0;
   entries_.clear();
   if (TakeWord("status")) {
@@ -337,8 +337,8 @@ bool Reader::ReadList() {
 
 bool Reader::ReadRecord() {
   const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::recordParameters, "records", &node)) return false;
-  if (!ReadSelector(*node, node->offers.recordParameters, &values_)) return false;
+  if (!ReadNode(&NodeOffers::record, "records", &node)) return false;
+  if (!ReadSelector(*node, node->offers.record.types, &values_)) return false;
   KIF_Status status = 0;
   bytes_.clear();
   if (TakeWord("status")) {
@@ -370,7 +370,7 @@ bool Reader::FindPartByOffset(std::string_view name, Part *part) {
 
 bool Reader::FindPart(const NodeInfo &node, std::string_view name, Part *part) {
   if (name.starts_with('@')) return FindPartByOffset(name.substr(1), part);
-  for (const NodeField *field = node.fields; field->name != nullptr; ++field) {
+  for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
     if (name != field->name) continue;
     const PartType type = field->type == FieldType::kText     ? PartType::kText
                           : field->type == FieldType::kSigned ? PartType::kSigned
@@ -457,8 +457,8 @@ bool Reader::ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasS
 
 bool Reader::ReadContent() {
   const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::contentParameters, "content", &node)) return false;
-  if (!ReadSelector(*node, node->offers.contentParameters, &values_)) return false;
+  if (!ReadNode(&NodeOffers::content, "content", &node)) return false;
+  if (!ReadSelector(*node, node->offers.content.types, &values_)) return false;
   ContentAnswer content;
   bool hasLength = false;
   bool hasStatus = false;

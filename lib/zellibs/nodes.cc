@@ -7,17 +7,17 @@ const char kInterfaceDate[21] = "Nov 22 2026 00:00:00";
 
 namespace {
 
-constexpr NodeOffers Lists(const char *parentParameters) {
-  return {.listParameters = parentParameters};
+constexpr NodeOffers Lists(const ParameterTypes &parents) {
+  return {.list = parents};
 }
 
-constexpr NodeOffers Records(const char *parameters, uint32_t size,
+constexpr NodeOffers Records(const ParameterTypes &parameters, uint32_t size,
                              Instances found = Instances::kNone) {
   return NodeOffers{}.AndRecords(parameters, size, found);
 }
 
-constexpr NodeOffers Contents(const char *parameters, Instances found) {
-  return {.contentParameters = parameters, .instances = found};
+constexpr NodeOffers Contents(const ParameterTypes &parameters, Instances found) {
+  return {.content = parameters, .instances = found};
 }
 
 constexpr NodeField U8(uint32_t offset, const char *name) {
@@ -57,14 +57,18 @@ constexpr uint64_t Hash(uint64_t hash, const char *text) {
   return Hash(hash, text == nullptr ? 0x100 : 0x101);
 }
 
-constexpr uint64_t Hash(uint64_t hash, const NodeInfo &node) {
+constexpr uint64_t Hash(uint64_t hash, const ParameterTypes &parameters) {
+  return Hash(hash, parameters.offered ? parameters.types : nullptr);
+}
+
+constexpr uint64_t Hash(uint64_t hash, const NodeInfo &node, const NodeField *field) {
   hash = Hash(hash, node.path);
-  hash = Hash(hash, node.offers.listParameters);
-  hash = Hash(hash, node.offers.recordParameters);
+  hash = Hash(hash, node.offers.list);
+  hash = Hash(hash, node.offers.record);
   hash = Hash(hash, node.offers.recordSize);
-  hash = Hash(hash, node.offers.contentParameters);
+  hash = Hash(hash, node.offers.content);
   hash = Hash(hash, node.offers.settable ? 1 : 0);
-  for (const NodeField *field = node.fields; field->name != nullptr; ++field) {
+  for (; field->name != nullptr; ++field) {
     hash = Hash(hash, field->name);
     hash = Hash(hash, field->offset);
     hash = Hash(hash, field->size);
@@ -76,22 +80,32 @@ constexpr uint64_t Hash(uint64_t hash, const NodeInfo &node) {
 }  // namespace
 
 constexpr NodeInfo kNodes[kNodeCount] = {
-#define NODE(path, offers, ...) {#path, offers, k_##path},
+#define NODE(path, offers, ...) {#path, offers},
 #include "nodes.def"
 #undef NODE
 };
 
 namespace {
 
+constexpr const NodeField *kFields[kNodeCount] = {
+#define NODE(path, ...) k_##path,
+#include "nodes.def"
+#undef NODE
+};
+
 constexpr uint64_t HashTable() {
   uint64_t hash = kHashBasis;
-  for (const NodeInfo &node : kNodes) hash = Hash(hash, node);
+  for (size_t i = 0; i < kNodeCount; ++i) hash = Hash(hash, kNodes[i], kFields[i]);
   return hash;
 }
 
 constexpr uint64_t kSignature = HashTable();
 
 }  // namespace
+
+const NodeField *FieldsOf(const NodeInfo &node) {
+  return kFields[IndexOf(node)];
+}
 
 const NodeInfo *FindNode(uint32_t node) {
   return node >= 1 && node <= kNodeCount ? &kNodes[node - 1] : nullptr;

@@ -29,18 +29,33 @@ enum class Instances : uint8_t {
   kOwnListIndex,  // the places 0 to count - 1 of the node's own instance lists
 };
 
-// What a node offers, and the types ('i' integer, 's' string) of the parameters that select it.
+// The types ('i' integer, 's' text) of the parameters that select an answer, where there are
+// answers at all.
+struct ParameterTypes {
+  bool offered = false;
+  char types[5] = "";
+
+  constexpr ParameterTypes() = default;
+  template <size_t Size>
+  constexpr ParameterTypes(const char (&given)[Size]) : offered(true) {
+    static_assert(Size <= sizeof(types));
+    for (size_t i = 0; i < Size; ++i) types[i] = given[i];
+  }
+};
+
+// What a node offers.
 struct NodeOffers {
-  const char *listParameters = nullptr;     // null: no instance lists
-  const char *recordParameters = nullptr;   // null: no records
-  uint32_t recordSize = 0;                  // in bytes
-  const char *contentParameters = nullptr;  // null: no content
+  ParameterTypes list = {};  // instance lists, by the instance above them
+  ParameterTypes record = {};
+  uint32_t recordSize = 0;  // in bytes
+  ParameterTypes content = {};
   bool settable = false;
   Instances instances = Instances::kNone;
 
-  constexpr NodeOffers AndRecords(const char *parameters, uint32_t size, Instances found) const {
+  constexpr NodeOffers AndRecords(const ParameterTypes &parameters, uint32_t size,
+                                  Instances found) const {
     NodeOffers offers = *this;
-    offers.recordParameters = parameters;
+    offers.record = parameters;
     offers.recordSize = size;
     offers.instances = found;
     return offers;
@@ -52,10 +67,11 @@ struct NodeOffers {
   }
 };
 
+// Without pointers, so that the table is mapped as it is and a process that starts has nothing of
+// it to relocate.
 struct NodeInfo {
-  const char *path;
+  char path[72];
   NodeOffers offers;
-  const NodeField *fields;  // ended by a field without a name
 };
 
 // The places of the nodes in the table, kNode_<path>; the number of a node is its place plus 1.
@@ -67,6 +83,9 @@ enum NodeIndex : uint16_t {
 };
 
 extern const NodeInfo kNodes[kNodeCount];
+
+// The named fields of a node's record, ended by one without a name.
+const NodeField *FieldsOf(const NodeInfo &node);
 
 // The node with the number `node`, or null.
 const NodeInfo *FindNode(uint32_t node);

@@ -35,7 +35,7 @@ KIF_Status GetRecord(uint32_t number, const KIF_ParamList *instance, void *buffe
   const Host *host;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (node->offers.recordParameters == nullptr) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->offers.record.offered) return KIF_STATUS_NOT_SUPPORTED;
   if (buffer == nullptr || size < node->offers.recordSize) return KIF_STATUS_BAD_PARAMETER;
   memset(buffer, 0, size);
   return host->getRecord(*node, instance, buffer);
@@ -46,7 +46,7 @@ KIF_Status GetInstances(uint32_t number, const KIF_ParamList *parent, KIF_ParamL
   const Host *host;
   KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (node->offers.listParameters == nullptr) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->offers.list.offered) return KIF_STATUS_NOT_SUPPORTED;
   if (list == nullptr) return KIF_STATUS_BAD_PARAMETER;
   KIF_ParamList *instances = KIF_ParamListCreate(KIF_PARAMLIST_INSTANCE, 0);
   if (instances == nullptr) return KIF_STATUS_NO_MEMORY;
@@ -66,7 +66,7 @@ KIF_Status GetContentLength(uint32_t number, const KIF_ParamList *instance, uint
   *length = 0;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (node->offers.contentParameters == nullptr) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->offers.content.offered) return KIF_STATUS_NOT_SUPPORTED;
   return host->getContentLength(*node, instance, length);
 }
 
@@ -76,7 +76,7 @@ KIF_Status GetContent(uint32_t number, const KIF_ParamList *instance, KIFData *i
   const Host *host;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (node->offers.contentParameters == nullptr) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->offers.content.offered) return KIF_STATUS_NOT_SUPPORTED;
   ContentRequest request;
   if (input == nullptr || output == nullptr || DataOf(input)->length < sizeof(request)) {
     return KIF_STATUS_BAD_PARAMETER;

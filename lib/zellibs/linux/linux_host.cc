@@ -69,10 +69,10 @@ constexpr bool InTableOrder() {
 }
 static_assert(InTableOrder());
 
-// Whether `list` holds the parameters that `types` asks for; texts must have a value.
-bool Selects(const KIF_ParamList *list, const char *types) {
+// Whether `list` holds `parameters`; texts must have a value.
+bool Selects(const KIF_ParamList *list, const ParameterTypes &parameters) {
   uint32_t count = 0;
-  for (; types[count] != '\0'; ++count) {
+  for (const char *types = parameters.types; types[count] != '\0'; ++count) {
     int64_t integer;
     const bool fits =
         types[count] == 'i' ? IntegerAt(list, count, &integer) : TextAt(list, count) != nullptr;
@@ -82,26 +82,26 @@ bool Selects(const KIF_ParamList *list, const char *types) {
 }
 
 KIF_Status GetLinuxRecord(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
-  if (!Selects(instance, node.offers.recordParameters)) return KIF_STATUS_BAD_PARAMETER;
+  if (!Selects(instance, node.offers.record)) return KIF_STATUS_BAD_PARAMETER;
   return kLinuxNodes[IndexOf(node)].getRecord(node, instance, record);
 }
 
 KIF_Status GetLinuxInstances(const NodeInfo &node, const KIF_ParamList *parent,
                              KIF_ParamList *list) {
-  if (!Selects(parent, node.offers.listParameters)) return KIF_STATUS_BAD_PARAMETER;
+  if (!Selects(parent, node.offers.list)) return KIF_STATUS_BAD_PARAMETER;
   return kLinuxNodes[IndexOf(node)].listInstances(node, parent, list);
 }
 
 // One node has content and one takes writes.
 KIF_Status GetLinuxContentLength(const NodeInfo &node, const KIF_ParamList *instance,
                                  uint32_t *length) {
-  if (!Selects(instance, node.offers.contentParameters)) return KIF_STATUS_BAD_PARAMETER;
+  if (!Selects(instance, node.offers.content)) return KIF_STATUS_BAD_PARAMETER;
   return GetBootOptionFileLength(node, instance, length);
 }
 
 KIF_Status GetLinuxContent(const NodeInfo &node, const KIF_ParamList *instance, uint32_t offset,
                            uint32_t wanted, void *bytes, uint32_t *given) {
-  if (!Selects(instance, node.offers.contentParameters)) return KIF_STATUS_BAD_PARAMETER;
+  if (!Selects(instance, node.offers.content)) return KIF_STATUS_BAD_PARAMETER;
   return ReadBootOptionFile(node, instance, offset, wanted, bytes, given);
 }
 
