@@ -96,20 +96,11 @@ bool VerifyContent(CacheFile *file) {
   return true;
 }
 
-void FindNodes(CacheFile *file) {
-  const auto *nodes = file->content->nodes();
-  if (nodes == nullptr) return;
-  for (const NodeInfo &node : kNodes) {
-    file->nodes[IndexOf(node)] = nodes->LookupByKey(node.path);
-  }
-}
-
 KIF_Status Verify(CacheFile *file) {
   const KIF_Status status = ReadVersion(*file);
   if (status != KIF_STATUS_OK) return status;
-  if (!VerifyHeader(file) || !VerifyContent(file)) return KIF_STATUS_DAMAGED_CACHE_FILE;
-  FindNodes(file);
-  return KIF_STATUS_OK;
+  const bool sound = VerifyHeader(file) && VerifyContent(file);
+  return sound ? KIF_STATUS_OK : KIF_STATUS_DAMAGED_CACHE_FILE;
 }
 
 }  // namespace

@@ -19,7 +19,6 @@ struct CacheFile {
   size_t size;
   const cache::File *header;
   const cache::Content *content;
-  const cache::Node *nodes[kNodeCount];  // by NodeIndex; null where the file has nothing of it
   const cache::Parameter *parameters;
   uint32_t parameterCount;
   const uint8_t *bytes;

@@ -13,13 +13,26 @@ constexpr size_t kMostListText = size_t{64} << 20;
 
 CacheFile recording;
 
-// A tool that walks a list reads the records in their order: where the last look-up of each node
-// ended, the next one is tried first.
-struct Hints {
-  uint32_t record;
-  uint32_t list;
+// The answers of a node, looked up in the file when the node is first asked for.
+struct Answers {
+  bool lookedUp;
+  const cache::Node *node;  // null where the file has nothing of it
+  // A tool that walks a list reads the records in their order: where the last look-up ended, the
+  // next one is tried first.
+  uint32_t recordHint;
+  uint32_t listHint;
 };
-Hints hints[kNodeCount];
+Answers answersByNode[kNodeCount];
+
+Answers *AnswersOf(const NodeInfo &node) {
+  Answers *answers = &answersByNode[IndexOf(node)];
+  if (!answers->lookedUp) {
+    const auto *nodes = recording.content->nodes();
+    answers->node = nodes != nullptr ? nodes->LookupByKey(node.path) : nullptr;
+    answers->lookedUp = true;
+  }
+  return answers;
+}
 
 // How a recorded parameter and a given one compare; false where the recorded one is broken.
 bool Compare(const cache::Parameter &recorded, const Param &given, int *order) {
@@ -83,11 +96,10 @@ KIF_Status Find(const flatbuffers::Vector<const Answer *> *answers, const KIF_Pa
 }
 
 KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
-  const NodeIndex index = IndexOf(node);
-  if (recording.nodes[index] == nullptr) return KIF_STATUS_NOT_FOUND;
+  Answers *answers = AnswersOf(node);
+  if (answers->node == nullptr) return KIF_STATUS_NOT_FOUND;
   const cache::Record *answer;
-  const KIF_Status status =
-      Find(recording.nodes[index]->records(), instance, &hints[index].record, &answer);
+  const KIF_Status status = Find(answers->node->records(), instance, &answers->recordHint, &answer);
   if (status != KIF_STATUS_OK) return status;
   if (answer->status() != KIF_STATUS_OK) return answer->status();
   if (answer->length() > node.offers.recordSize ||
@@ -115,10 +127,10 @@ KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list, size_t *te
 }
 
 KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list) {
-  const NodeIndex index = IndexOf(node);
-  if (recording.nodes[index] == nullptr) return KIF_STATUS_NOT_FOUND;
+  Answers *answers = AnswersOf(node);
+  if (answers->node == nullptr) return KIF_STATUS_NOT_FOUND;
   const cache::List *answer;
-  KIF_Status status = Find(recording.nodes[index]->lists(), parent, &hints[index].list, &answer);
+  KIF_Status status = Find(answers->node->lists(), parent, &answers->listHint, &answer);
   if (status != KIF_STATUS_OK) return status;
   if (answer->status() != KIF_STATUS_OK) return answer->status();
   if (!HasParameters(recording, answer->first(), answer->count())) {
@@ -134,7 +146,7 @@ KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_P
 
 KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance,
                        const cache::Stored **answer) {
-  const cache::Node *recorded = recording.nodes[IndexOf(node)];
+  const cache::Node *recorded = AnswersOf(node)->node;
   if (recorded == nullptr) return KIF_STATUS_NOT_FOUND;
   uint32_t hint = 0;
   const KIF_Status status = Find(recorded->contents(), instance, &hint, answer);
@@ -169,7 +181,7 @@ KIF_Status GetContent(const NodeInfo &node, const KIF_ParamList *instance, uint3
 KIF_Status Set(const NodeInfo &node, const KIF_ParamList *instance, const KIF_ParamList *input) {
   (void)instance;
   (void)input;
-  const cache::Node *recorded = recording.nodes[IndexOf(node)];
+  const cache::Node *recorded = AnswersOf(node)->node;
   return recorded != nullptr ? recorded->set_status() : KIF_STATUS_OK;
 }
 
@@ -192,7 +204,7 @@ KIF_Status OpenRecordedHost(const char *path, const Host **host) {
   if (status != KIF_STATUS_OK) return status;
   CloseCacheFile(&recording);
   recording = opened;
-  memset(hints, 0, sizeof(hints));
+  memset(answersByNode, 0, sizeof(answersByNode));
   *host = &kRecordedHost;
   return KIF_STATUS_OK;
 }
