@@ -26,7 +26,7 @@ struct LiveObject {
   TraceKind kind;
   const void *address;
 };
-LiveObject live[kMostLive];
+LiveObject *live;  // made when tracing begins
 size_t liveCount;
 
 // A line under way; what does not fit is cut.
@@ -73,7 +73,8 @@ bool IsOn() {
     tracing = Tracing::kOff;
     if (path != nullptr && path[0] != '\0') {
       descriptor = open(path, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600);
-      if (descriptor >= 0 && atexit(ReportLive) == 0) tracing = Tracing::kOn;
+      live = static_cast<LiveObject *>(calloc(kMostLive, sizeof(LiveObject)));
+      if (descriptor >= 0 && live != nullptr && atexit(ReportLive) == 0) tracing = Tracing::kOn;
     }
   }
   return tracing == Tracing::kOn;

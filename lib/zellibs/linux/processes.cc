@@ -314,18 +314,25 @@ KIF_Status PlaceOfThread(int64_t id, uint32_t *found) {
 }
 
 // In a picture of cartels a process is read when it is asked for. One that has ended since counts
-// as a zombie.
+// as a zombie. Its own file is reached in half the time of its main thread's and says the same, but
+// for the times: those count as given, so that who asks for them reads the thread's.
 KIF_Status ReadMainThread(Process *process) {
   if (process->mainThread != kNoThread) return KIF_STATUS_OK;
+  char path[kPathSize];
   Stat stat;
-  KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
+  snprintf(path, sizeof(path), "%d/stat", process->id);
+  KIF_Status status = ReadStat(picture->proc.fd(), path, &stat);
   if (status == KIF_STATUS_OK && IsDead(stat.state)) status = KIF_STATUS_NOT_FOUND;
   process->isZombie = status == KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
   FillProcess(stat, process);
-  process->mainThread = static_cast<uint32_t>(picture->threads.size());
-  return AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
-                      stat);
+  const auto place = static_cast<uint32_t>(picture->threads.size());
+  status = AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
+                        stat);
+  if (status != KIF_STATUS_OK) return status;
+  process->mainThread = place;
+  picture->threads[place].served = static_cast<uint8_t>(ThreadValue::kTimes);
+  return KIF_STATUS_OK;
 }
 
 // Reads what the userspaces of a picture of cartels are worked out from.
@@ -582,7 +589,7 @@ KIF_Status ReadAllowedCpus(int64_t id, char *text, size_t size) {
     return ReadRecordedCpus(picture->processes[picture->threads[place].process], id, text, size);
   }
   if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
-  static unsigned char mask[8192 / 8];  // NR_CPUS is at most 8192
+  unsigned char mask[8192 / 8] = {};  // NR_CPUS is at most 8192
   static unsigned char lastMask[sizeof(mask)];
   static char lastText[2304];
   // The system call itself tells how much of the mask the kernel has; libc's wrapper does not.
