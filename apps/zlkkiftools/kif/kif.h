@@ -89,6 +89,9 @@ class InstanceWalk {
   // next step.
   KIF_Status Replace(int64_t value);
 
+  // Takes the current entry off the selecting list already, not only at the next step.
+  void TakeOff();
+
   // Number of entries to walk over.
   uint32_t count() const { return count_ > 0 ? static_cast<uint32_t>(count_) : 0; }
 
@@ -99,8 +102,6 @@ class InstanceWalk {
   uint32_t index() const { return static_cast<uint32_t>(next_ - 1); }
 
  private:
-  void TakeOff();
-
   KIF_ParamList *instances_;
   KIF_ParamList *selector_;
   int32_t count_;

@@ -86,23 +86,27 @@ KIF_Status PrintObjects(KIF_NodeId node, const char *what, const Cartel &cartel,
   return 0;
 }
 
-// Prints the rows of the cartel that `selector` holds, as far as it can be read.
-KIF_Status PrintCartel(int32_t cartelID, KIF_ParamList *selector) {
+// Prints the rows of the cartel that `walk` is at, as far as it can be read.
+KIF_Status PrintCartel(InstanceWalk *walk) {
+  KIF_ParamList *selector = walk->selector();
+  const auto cartelID = static_cast<int32_t>(KIF_ParamGetInt(walk->param()));
   WorldName world = {};
   if (ReadRecord(KIF_NODE_world_name, selector, &world) != 0) return 0;
   const Cartel cartel = {cartelID, FieldText(world.name)};
 
   ParamListHandle descriptors;
   if (GetInstanceList(KIF_NODE_userworld_cartel_fd_fds, selector, &descriptors) != 0) return 0;
-  const KIF_Status status = PrintObjects<DescriptorRecord>(KIF_NODE_userworld_cartel_fd_fds, "fd",
-                                                           cartel, descriptors.get(), selector);
+  KIF_Status status = PrintObjects<DescriptorRecord>(KIF_NODE_userworld_cartel_fd_fds, "fd", cartel,
+                                                     descriptors.get(), selector);
   descriptors.reset();
   if (status != 0) return status;
 
   ParamListHandle mappings;
   if (GetInstanceList(KIF_NODE_userworld_cartel_mem_mmaps, selector, &mappings) != 0) return 0;
-  return PrintObjects<MappingRecord>(KIF_NODE_userworld_cartel_mem_mmaps, "mmap", cartel,
-                                     mappings.get(), selector);
+  status = PrintObjects<MappingRecord>(KIF_NODE_userworld_cartel_mem_mmaps, "mmap", cartel,
+                                       mappings.get(), selector);
+  if (status == 0) walk->TakeOff();  // before the list goes
+  return status;
 }
 
 KIF_Status WalkWorldList() {
@@ -121,8 +125,7 @@ KIF_Status WalkWorldList() {
   puts("----------+---------------------+---------------------+--------+------------------");
   InstanceWalk walk(cartels.get(), selector.get());
   while (walk.Next()) {
-    const auto cartelID = static_cast<int32_t>(KIF_ParamGetInt(walk.param()));
-    status = PrintCartel(cartelID, selector.get());
+    status = PrintCartel(&walk);
     if (status != 0) return status;
   }
   return walk.failed() ? KIF_STATUS_FAILURE : 0;
