@@ -7,6 +7,7 @@
 #include "kif/zellibs.h"
 #include "nodes.h"
 #include "param_list.h"
+#include "records/platform.h"
 #include "status.h"
 #include "trace.h"
 
@@ -15,13 +16,6 @@
 #undef NODE
 
 namespace {
-
-// A request for content, the input of KIF_SetData.
-struct ContentRequest {
-  uint32_t offset;
-  uint32_t wanted;
-};
-static_assert(sizeof(ContentRequest) == 8);
 
 KIF_Status FindNodeAndHost(uint32_t number, const NodeInfo **node, const Host **host) {
   *node = FindNode(number);

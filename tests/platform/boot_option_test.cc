@@ -81,7 +81,7 @@ TEST_F(BootOptionTest, SplitsTheCommandLineAtItsFirstBlank) {
   Expect(host(" a"), {"-rko"}, "\na\n");
   Expect(host("k\\tx y"), {"-rko"}, "k\tx\ny\n");
   Expect(host(""), {"-pk"}, "Booted via (g)PXE : 0\nKernel : \n");
-  const std::string full(4094, 'x');
+  const std::string full(4093, 'x');
   Expect(host("k " + full), {"-ro"}, full + "\n");
 }
 

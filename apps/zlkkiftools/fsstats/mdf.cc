@@ -3,7 +3,7 @@
 #include <stdio.h>
 #include <unistd.h>
 
-#include "fsstats/morelfs_records.h"
+#include "fsstats/volume_stats.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"

@@ -10,10 +10,10 @@
 #include <memory>
 
 #include "free_deleter.h"
-#include "fsstats/morelfs_records.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"
+#include "records/morelfs.h"
 #include "tools.h"
 
 namespace {

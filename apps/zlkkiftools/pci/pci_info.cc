@@ -10,7 +10,7 @@
 
 #include "kif/kif.h"
 #include "kiftools.h"
-#include "pci/pci_records.h"
+#include "records/pci.h"
 #include "tools.h"
 
 namespace {

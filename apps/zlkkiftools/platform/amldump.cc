@@ -8,20 +8,10 @@
 
 #include "kif/kif.h"
 #include "output.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
-
-constexpr size_t kSignatureLength = 4;
-
-struct __attribute__((packed)) TableBuffer {
-  char signature[kSignatureLength + 1];  // the kernel does not end it
-  uint32_t length;                       // bytes of `data`
-  uint8_t data[131075];
-};
-static_assert(sizeof(TableBuffer) == 131084);
-static_assert(offsetof(TableBuffer, length) == 5);
-static_assert(offsetof(TableBuffer, data) == 9);
 
 // How often each signature came up, in the order in which they came up first.
 class SignatureCounter {
@@ -32,7 +22,7 @@ class SignatureCounter {
   SignatureCounter &operator=(const SignatureCounter &) = delete;
 
   // Counts `signature` in; `*before` is how often it had come up before. False without memory.
-  bool Count(const char (&signature)[kSignatureLength + 1], int *before) {
+  bool Count(const char (&signature)[kAcpiSignatureLength + 1], int *before) {
     size_t i = 0;
     while (i < count_ && memcmp(entries_[i].signature, signature, sizeof(signature)) != 0) ++i;
     if (i == count_ && !Append(signature)) return false;
@@ -42,11 +32,11 @@ class SignatureCounter {
 
  private:
   struct Entry {
-    char signature[kSignatureLength + 1];
+    char signature[kAcpiSignatureLength + 1];
     int count;
   };
 
-  bool Append(const char (&signature)[kSignatureLength + 1]) {
+  bool Append(const char (&signature)[kAcpiSignatureLength + 1]) {
     void *grown = realloc(entries_, (count_ + 1) * sizeof(Entry));
     if (grown == nullptr) return false;
     entries_ = static_cast<Entry *>(grown);
@@ -101,9 +91,9 @@ bool FailWithErrno() {
 }
 
 // A signature becomes part of a file name, and a cache file may come from anywhere.
-bool IsFileName(const char (&signature)[kSignatureLength + 1]) {
+bool IsFileName(const char (&signature)[kAcpiSignatureLength + 1]) {
   const size_t length = strlen(signature);
-  for (size_t i = 0; i < kSignatureLength; ++i) {
+  for (size_t i = 0; i < kAcpiSignatureLength; ++i) {
     const auto byte = static_cast<unsigned char>(signature[i]);
     if (i >= length ? byte != 0 : byte < ' ' || byte == 0x7f || byte == '/') return false;
   }

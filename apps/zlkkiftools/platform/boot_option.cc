@@ -3,39 +3,15 @@
 #include <stdio.h>
 #include <string.h>
 
-#include "fsstats/morelfs_records.h"
+#include "fsstats/volume_stats.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
 
-struct __attribute__((packed)) BootFlags {
-  uint8_t auditMode;
-  uint8_t fsCheck;
-  uint8_t rollback;
-  uint8_t unused3;
-};
-static_assert(sizeof(BootFlags) == 4);
-static_assert(offsetof(BootFlags, auditMode) == 0);
-static_assert(offsetof(BootFlags, fsCheck) == 1);
-static_assert(offsetof(BootFlags, rollback) == 2);
-
-struct __attribute__((packed)) BootMac {
-  char address[24];  // empty: not booted over the network
-};
-static_assert(sizeof(BootMac) == 24);
-
-struct __attribute__((packed)) ContentRequest {
-  uint32_t offset;  // bytes
-  uint32_t wanted;  // bytes
-};
-static_assert(sizeof(ContentRequest) == 8);
-static_assert(offsetof(ContentRequest, offset) == 0);
-static_assert(offsetof(ContentRequest, wanted) == 4);
-
-constexpr uint32_t kCommandLineSize = 4096;
 constexpr uint32_t kLargestChunk = 3 << 20;
 
 struct Request {
@@ -244,19 +220,17 @@ bool PrintAllContents(const Request &request) {
 // What the boot command line says, with the other things that stand between its kernel and its
 // options in the output.
 bool PrintCommandLine(const Request &request) {
-  char commandLine[kCommandLineSize + 1] = "";
+  BootCommandLine line = {};
   char *options = nullptr;
   if (request.pxe || request.kernel || request.options) {
-    if (KIF_Get(KIF_NODE_system_bootCmdLine, nullptr, commandLine, kCommandLineSize) != 0) {
-      return false;
-    }
+    if (ReadRecord(KIF_NODE_system_bootCmdLine, nullptr, &line) != 0) return false;
     if (request.pxe && !PrintPxe(request)) return false;
-    options = strchr(commandLine, ' ');
+    options = strchr(FieldText(line.text), ' ');
     if (options != nullptr) *options++ = '\0';
   }
   if (request.kernel) {
     PrintLabel(request, "Kernel : ");
-    printf("%s\n", Shown(commandLine).text());
+    printf("%s\n", Shown(line.text).text());
   }
   if (request.allContents && !PrintAllContents(request)) return false;
   if (request.options) {
@@ -276,7 +250,7 @@ bool PrintModules(const Request &request) {
     if (name == nullptr) return false;
     TardiskStats stats = {};
     if (ReadVolumeStats(KIF_NODE_system_morelfs_tardisks_stats, name, &stats) != 0) return false;
-    if (stats.usedToBoot != 0) printf("%s ", Shown(name).text());
+    if (static_cast<uint8_t>(stats.usedToBoot) != 0) printf("%s ", Shown(name).text());
   }
   putchar('\n');
   return true;

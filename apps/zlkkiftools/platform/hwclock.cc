@@ -3,28 +3,12 @@
 #include <stdio.h>
 
 #include "kif/kif.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
 
 constexpr int32_t kNotGiven = -1;
-
-struct __attribute__((packed)) ClockRecord {
-  int32_t hour;
-  int32_t minute;
-  int32_t second;
-  int32_t day;
-  int32_t month;
-  int32_t year;
-  uint8_t unused24[8];
-};
-static_assert(sizeof(ClockRecord) == 32);
-static_assert(offsetof(ClockRecord, hour) == 0);
-static_assert(offsetof(ClockRecord, minute) == 4);
-static_assert(offsetof(ClockRecord, second) == 8);
-static_assert(offsetof(ClockRecord, day) == 12);
-static_assert(offsetof(ClockRecord, month) == 16);
-static_assert(offsetof(ClockRecord, year) == 20);
 
 struct ClockTime {
   int32_t hour = kNotGiven;

@@ -4,30 +4,10 @@
 
 #include "kif/kif.h"
 #include "output.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
-
-struct __attribute__((packed)) CpuInfo {
-  uint8_t unused0[16];
-  uint32_t numPcpus;
-  uint8_t unused20[16];
-};
-static_assert(sizeof(CpuInfo) == 36);
-static_assert(offsetof(CpuInfo, numPcpus) == 16);
-
-struct __attribute__((packed)) UsageStatus {
-  uint8_t unused0[8];
-  uint8_t usage;  // 0: a device of the kernel itself
-  uint8_t unused9[3];
-};
-static_assert(sizeof(UsageStatus) == 12);
-static_assert(offsetof(UsageStatus, usage) == 8);
-
-struct __attribute__((packed)) PcpuCount {
-  uint64_t count;
-};
-static_assert(sizeof(PcpuCount) == 8);
 
 constexpr size_t kDeviceTextSize = 64;
 

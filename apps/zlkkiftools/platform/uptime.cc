@@ -3,32 +3,10 @@
 #include <time.h>
 
 #include "kif/kif.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
-
-struct __attribute__((packed)) UptimeRecord {
-  uint32_t seconds;
-  uint8_t unused4[4];
-};
-static_assert(sizeof(UptimeRecord) == 8);
-static_assert(offsetof(UptimeRecord, seconds) == 0);
-
-struct __attribute__((packed)) PcpuRecord {
-  uint8_t unused0[4];
-  uint32_t numPcpus;
-  uint8_t unused8[4];
-};
-static_assert(sizeof(PcpuRecord) == 12);
-static_assert(offsetof(PcpuRecord, numPcpus) == 4);
-
-struct __attribute__((packed)) LoadHistoryRecord {
-  uint8_t unused0[4];
-  uint32_t loadInPct;
-  uint8_t unused8[136];
-};
-static_assert(sizeof(LoadHistoryRecord) == 144);
-static_assert(offsetof(LoadHistoryRecord, loadInPct) == 4);
 
 struct LoadHistory {
   KIF_NodeId node;

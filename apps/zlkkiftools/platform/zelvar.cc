@@ -5,24 +5,10 @@
 
 #include "kif/kif.h"
 #include "output.h"
+#include "records/platform.h"
 #include "tools.h"
 
 namespace {
-
-struct __attribute__((packed)) VersionRecord {
-  char product[32];
-  char version[64];
-  char releaseLevel[64];
-  char update[132];
-  int32_t buildNumber;
-  uint8_t unused296[16];
-};
-static_assert(sizeof(VersionRecord) == 312);
-static_assert(offsetof(VersionRecord, product) == 0);
-static_assert(offsetof(VersionRecord, version) == 32);
-static_assert(offsetof(VersionRecord, releaseLevel) == 96);
-static_assert(offsetof(VersionRecord, update) == 160);
-static_assert(offsetof(VersionRecord, buildNumber) == 292);
 
 int Usage() {
   fputs(

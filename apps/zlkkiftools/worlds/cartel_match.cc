@@ -1,7 +1,7 @@
 #include "worlds/cartel_match.h"
 
+#include "records/worlds.h"
 #include "worlds/command_line.h"
-#include "worlds/world_records.h"
 
 PatternHandle CompilePattern(const char *text, char (&error)[kPatternErrorSize]) {
   error[0] = '\0';

@@ -5,40 +5,10 @@
 
 #include "kif/kif.h"
 #include "output.h"
+#include "records/worlds.h"
 #include "tools.h"
-#include "worlds/world_records.h"
 
 namespace {
-
-// KIF_NODE_userworld_cartel_fd_fds, for a cartel ID and a descriptor number.
-struct __attribute__((packed)) DescriptorRecord {
-  unsigned char unused0[4];
-  char kind[96];
-  char description[1984];
-};
-static_assert(sizeof(DescriptorRecord) == 2084);
-static_assert(offsetof(DescriptorRecord, kind) == 4 &&
-              offsetof(DescriptorRecord, description) == 100);
-
-// KIF_NODE_userworld_cartel_mem_mmaps, for a cartel ID and a mapping of its list.
-struct __attribute__((packed)) MappingRecord {
-  unsigned char unused0[8];
-  uint32_t length;  // in bytes
-  unsigned char unused12[4];
-  uint32_t kind;
-  uint32_t protection;  // set of kReadable, kWritable
-  int32_t descriptor;
-  char description[2008];
-};
-static_assert(sizeof(MappingRecord) == 2036);
-static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
-              offsetof(MappingRecord, protection) == 20 &&
-              offsetof(MappingRecord, descriptor) == 24 &&
-              offsetof(MappingRecord, description) == 28);
-
-constexpr uint32_t kListedMappingKind = 2;
-constexpr uint32_t kReadable = 0x1;
-constexpr uint32_t kWritable = 0x2;
 
 struct Cartel {
   int32_t cartelID;
@@ -54,13 +24,13 @@ void PrintRow(const Cartel &cartel, int32_t descriptor, DescriptorRecord *record
 }
 
 void PrintRow(const Cartel &cartel, int32_t, MappingRecord *record) {
-  if (record->kind != kListedMappingKind) return;
+  if (record->kind != kMappingOfFile) return;
   const Shown name(cartel.name);
   const Shown description(FieldText(record->description));
   printf("%-10d  %-20s  %-20s   %6d   %s (prot:%s%s/len:%u)\n", cartel.cartelID, name.text(),
          "MMAP", record->descriptor, description.text(),
-         (record->protection & kReadable) != 0 ? "R" : "-",
-         (record->protection & kWritable) != 0 ? "W" : "-", record->length);
+         (record->protection & kMappingReadable) != 0 ? "R" : "-",
+         (record->protection & kMappingWritable) != 0 ? "W" : "-", record->length);
 }
 
 // Prints the rows of the `objects`, instances of `node`, of the cartel that `selector` holds;

@@ -7,9 +7,9 @@
 #include <unistd.h>
 
 #include "kif/kif.h"
+#include "records/worlds.h"
 #include "tools.h"
 #include "worlds/command_line.h"
-#include "worlds/world_records.h"
 
 namespace {
 

@@ -7,7 +7,7 @@
 
 #include "kif/zellibs.h"
 #include "output.h"
-#include "worlds/world_records.h"
+#include "records/worlds.h"
 
 namespace {
 

@@ -4,8 +4,8 @@
 #include <stdlib.h>
 
 #include "kif/kif.h"
+#include "records/worlds.h"
 #include "tools.h"
-#include "worlds/world_records.h"
 
 namespace {
 

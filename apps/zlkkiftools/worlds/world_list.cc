@@ -4,10 +4,10 @@
 
 #include <algorithm>
 
+#include "records/worlds.h"
 #include "worlds/ps_printer.h"
 #include "worlds/world_reader.h"
 #include "worlds/world_record.h"
-#include "worlds/world_records.h"
 
 uint32_t requestedUserspace = 0;
 uint32_t maxWorldID = 0;

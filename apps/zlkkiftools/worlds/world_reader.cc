@@ -4,7 +4,7 @@
 #include <string.h>
 
 #include "kif/kif.h"
-#include "worlds/world_records.h"
+#include "records/worlds.h"
 
 namespace {
 

@@ -11,20 +11,12 @@
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
 
-constexpr uint32_t kMostData = 131075;  // bytes of a table in one record
-
-struct __attribute__((packed)) AcpiBufferRecord {
-  char signature[4];
-  uint8_t zero;
-  uint32_t length;
-  uint8_t data[kMostData];
-};
-static_assert(sizeof(AcpiBufferRecord) == 131084);
-static_assert(offsetof(AcpiBufferRecord, length) == 5);
-static_assert(offsetof(AcpiBufferRecord, data) == 9);
+// Bytes of a table in one record.
+constexpr uint32_t kMostData = sizeof(TableBuffer::data);
 
 // Tables that were loaded after boot have a folder of their own.
 constexpr const char *kFolders[] = {"/sys/firmware/acpi/tables",
@@ -102,7 +94,7 @@ KIF_Status OpenTable(const KIF_ParamList *list, const AcpiTable **table, Descrip
 }
 
 // Reads up to kMostData bytes from `offset`; the kernel hands out a page at a time.
-KIF_Status ReadData(const Descriptor &file, off_t offset, AcpiBufferRecord *record) {
+KIF_Status ReadData(const Descriptor &file, off_t offset, TableBuffer *record) {
   uint32_t filled = 0;
   while (filled < kMostData) {
     const ssize_t got =
@@ -149,10 +141,10 @@ KIF_Status GetAcpiBuffer(const NodeInfo &, const KIF_ParamList *instance, void *
   if (!IntegerAt(instance, 1, &place) || place < 0 || place > INT32_MAX) {
     return KIF_STATUS_NOT_FOUND;
   }
-  auto *buffer = static_cast<AcpiBufferRecord *>(record);
+  auto *buffer = static_cast<TableBuffer *>(record);
   status = ReadData(file, static_cast<off_t>(place) * kMostData, buffer);
   if (status != KIF_STATUS_OK) return status;
   if (buffer->length == 0) return KIF_STATUS_NOT_FOUND;
-  memcpy(buffer->signature, table->name, strnlen(table->name, sizeof(buffer->signature)));
+  memcpy(buffer->signature, table->name, strnlen(table->name, kAcpiSignatureLength));
   return KIF_STATUS_OK;
 }

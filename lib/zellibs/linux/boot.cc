@@ -10,21 +10,11 @@
 #include "linux/files.h"
 #include "linux/kernel_release.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
 
-struct __attribute__((packed)) BootOptionRecord {
-  uint8_t auditMode;
-  uint8_t fsCheck;
-  uint8_t rollback;
-  uint8_t unused3;
-};
-static_assert(sizeof(BootOptionRecord) == 4);
-static_assert(offsetof(BootOptionRecord, auditMode) == 0);
-static_assert(offsetof(BootOptionRecord, fsCheck) == 1);
-
-constexpr size_t kCommandLineSize = 4096;  // of the record, the terminator included
-constexpr size_t kMacSize = 24;
+constexpr size_t kCommandLineSize = sizeof(BootCommandLine::text);
 
 // The kernel's own limit is far lower on every architecture.
 using CommandLine = char[16384];
@@ -141,7 +131,7 @@ KIF_Status GetBootOption(const NodeInfo &, const KIF_ParamList *, void *record) 
   CommandLine line;
   const KIF_Status status = ReadCommandLine(line);
   if (status != KIF_STATUS_OK) return status;
-  auto *option = static_cast<BootOptionRecord *>(record);
+  auto *option = static_cast<BootFlags *>(record);
   option->auditMode = HasValue(line, "audit=", "1");
   option->fsCheck = HasValue(line, "fsck.mode=", "force");
   return KIF_STATUS_OK;
@@ -175,7 +165,8 @@ KIF_Status GetBootMac(const NodeInfo &, const KIF_ParamList *, void *record) {
   if (status != KIF_STATUS_OK) return status;
   size_t length = 0;
   const char *address = FindValue(line, "BOOTIF=", &length);
-  if (address != nullptr) CopyText(static_cast<char *>(record), kMacSize, address, length);
+  if (address != nullptr)
+    CopyText(static_cast<char *>(record), sizeof(BootMac::address), address, length);
   return KIF_STATUS_OK;
 }
 

@@ -8,25 +8,9 @@
 
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
-
-struct __attribute__((packed)) ClockRecord {
-  int32_t hour;
-  int32_t minute;
-  int32_t second;
-  int32_t day;
-  int32_t month;
-  int32_t year;
-  uint8_t unused24[8];
-};
-static_assert(sizeof(ClockRecord) == 32);
-static_assert(offsetof(ClockRecord, hour) == 0);
-static_assert(offsetof(ClockRecord, minute) == 4);
-static_assert(offsetof(ClockRecord, second) == 8);
-static_assert(offsetof(ClockRecord, day) == 12);
-static_assert(offsetof(ClockRecord, month) == 16);
-static_assert(offsetof(ClockRecord, year) == 20);
 
 constexpr char kDevice[] = "/dev/rtc0";
 

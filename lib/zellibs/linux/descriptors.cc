@@ -13,17 +13,9 @@
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/sockets.h"
+#include "records/worlds.h"
 
 namespace {
-
-struct __attribute__((packed)) DescriptorRecord {
-  unsigned char unused0[4];
-  char kind[96];
-  char description[1984];
-};
-static_assert(sizeof(DescriptorRecord) == 2084);
-static_assert(offsetof(DescriptorRecord, kind) == 4 &&
-              offsetof(DescriptorRecord, description) == 100);
 
 // The process asked for last.
 struct KeptProcess {

@@ -8,16 +8,9 @@
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
-
-struct __attribute__((packed)) UsageRecord {
-  uint8_t unused0[8];
-  uint8_t hasDevices;
-  uint8_t unused9[3];
-};
-static_assert(sizeof(UsageRecord) == 12);
-static_assert(offsetof(UsageRecord, hasDevices) == 8);
 
 struct Row {
   uint64_t number;
@@ -169,7 +162,7 @@ KIF_Status ListInterrupts(const NodeInfo &, const KIF_ParamList *, KIF_ParamList
 KIF_Status GetInterruptUsage(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   size_t row;
   const KIF_Status status = FindRow(instance, &row);
-  if (status == KIF_STATUS_OK) static_cast<UsageRecord *>(record)->hasDevices = 1;
+  if (status == KIF_STATUS_OK) static_cast<UsageStatus *>(record)->usage = 1;
   return status;
 }
 
@@ -185,7 +178,7 @@ KIF_Status GetInterruptCount(const NodeInfo &, const KIF_ParamList *instance, vo
       !TakeCount(row, static_cast<size_t>(cpu), &behind, &count)) {
     return KIF_STATUS_NOT_FOUND;
   }
-  memcpy(record, &count, sizeof(count));
+  static_cast<PcpuCount *>(record)->count = count;
   return KIF_STATUS_OK;
 }
 

@@ -8,28 +8,11 @@
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/worlds.h"
 
 namespace {
 
-struct __attribute__((packed)) MappingRecord {
-  unsigned char unused0[8];
-  uint32_t length;  // in bytes
-  unsigned char unused12[4];
-  uint32_t kind;
-  uint32_t protection;  // set of kReadable, kWritable
-  int32_t descriptor;
-  char description[2008];
-};
-static_assert(sizeof(MappingRecord) == 2036);
-static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
-              offsetof(MappingRecord, protection) == 20 &&
-              offsetof(MappingRecord, descriptor) == 24 &&
-              offsetof(MappingRecord, description) == 28);
-
 constexpr uint32_t kOther = 1;
-constexpr uint32_t kFile = 2;
-constexpr uint32_t kReadable = 0x1;
-constexpr uint32_t kWritable = 0x2;
 
 struct Mapping {
   uint64_t start;
@@ -86,7 +69,8 @@ bool ParseLine(const char *line, size_t length, Mapping *mapping) {
       mapping->end < mapping->start || strcspn(place, " \n") < 2) {
     return false;
   }
-  mapping->protection = (place[0] == 'r' ? kReadable : 0u) | (place[1] == 'w' ? kWritable : 0u);
+  mapping->protection =
+      (place[0] == 'r' ? kMappingReadable : 0u) | (place[1] == 'w' ? kMappingWritable : 0u);
   for (int field = 0; field < 4; ++field) {
     place += strcspn(place, " \n");
     place += strspn(place, " ");
@@ -152,7 +136,7 @@ KIF_Status GetMapping(const NodeInfo &, const KIF_ParamList *instance, void *rec
   if (!FindMapping(static_cast<uint64_t>(start), &mapping)) return KIF_STATUS_NOT_FOUND;
   const uint64_t length = mapping.end - mapping.start;
   filled->length = length < UINT32_MAX ? static_cast<uint32_t>(length) : UINT32_MAX;
-  filled->kind = mapping.nameLength > 0 && mapping.name[0] == '/' ? kFile : kOther;
+  filled->kind = mapping.nameLength > 0 && mapping.name[0] == '/' ? kMappingOfFile : kOther;
   filled->protection = mapping.protection;
   filled->descriptor = -1;
   CopyText(filled->description, sizeof(filled->description), mapping.name, mapping.nameLength);

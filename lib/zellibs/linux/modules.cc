@@ -12,16 +12,9 @@
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/pci.h"
 
 namespace {
-
-struct __attribute__((packed)) ModuleRecord {
-  char name[288];
-  uint32_t moduleID;
-  uint8_t unused292[408];
-};
-static_assert(sizeof(ModuleRecord) == 700);
-static_assert(offsetof(ModuleRecord, moduleID) == 288);
 
 struct Module {
   char name[64];

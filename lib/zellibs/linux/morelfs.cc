@@ -10,29 +10,9 @@
 #include "linux/everlasting.h"
 #include "linux/linux_nodes.h"
 #include "linux/volumes.h"
+#include "records/morelfs.h"
 
 namespace {
-
-struct __attribute__((packed)) TardiskRecord {
-  uint32_t used;  // bytes
-  uint8_t unused4[4];
-  uint32_t usedToBoot;
-  uint8_t unused12[16];
-};
-static_assert(sizeof(TardiskRecord) == 28);
-static_assert(offsetof(TardiskRecord, usedToBoot) == 8);
-
-struct __attribute__((packed)) RamdiskRecord {
-  uint32_t minimum;   // MiB
-  uint32_t maximum;   // MiB
-  uint32_t used;      // pages of 4096 bytes
-  uint32_t peakUsed;  // pages
-  uint8_t unused16[164];
-};
-static_assert(sizeof(RamdiskRecord) == 180);
-static_assert(offsetof(RamdiskRecord, maximum) == 4);
-static_assert(offsetof(RamdiskRecord, used) == 8);
-static_assert(offsetof(RamdiskRecord, peakUsed) == 12);
 
 constexpr const char *kArchiveTypes[] = {"squashfs", "erofs", "cramfs", "iso9660"};
 constexpr const char *kMemoryTypes[] = {"tmpfs", "ramfs", "rootfs"};
@@ -192,7 +172,7 @@ KIF_Status GetTardisk(const NodeInfo &, const KIF_ParamList *instance, void *rec
   uint64_t bytes;
   status = ReadArchiveSize(*volume, &bytes);
   if (status != KIF_STATUS_OK) return status;
-  auto *tardisk = static_cast<TardiskRecord *>(record);
+  auto *tardisk = static_cast<TardiskStats *>(record);
   tardisk->used = Saturated(bytes);
   tardisk->usedToBoot = IsUsedToBoot(*volume);
   return KIF_STATUS_OK;
@@ -211,7 +191,7 @@ KIF_Status GetRamdisk(const NodeInfo &, const KIF_ParamList *instance, void *rec
   if (status != KIF_STATUS_OK) return status;
   if (space.f_blocks == 0) return KIF_STATUS_NOT_FOUND;
   const auto block = static_cast<uint64_t>(space.f_bsize);
-  auto *ramdisk = static_cast<RamdiskRecord *>(record);
+  auto *ramdisk = static_cast<RamdiskStats *>(record);
   ramdisk->maximum = Saturated((space.f_blocks * block + kMiB - 1) / kMiB);
   ramdisk->used = Saturated((space.f_blocks - space.f_bfree) * block / kPage);
   ramdisk->peakUsed = ramdisk->used;

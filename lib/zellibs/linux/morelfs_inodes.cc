@@ -13,32 +13,11 @@
 #include "linux/everlasting.h"
 #include "linux/linux_nodes.h"
 #include "linux/volumes.h"
+#include "records/morelfs.h"
 
 namespace {
 
-constexpr uint32_t kOnTardisk = 0x1;
-constexpr int32_t kUnlinked = -4;
-
-struct __attribute__((packed)) InodeRecord {
-  uint8_t unused0[4];
-  uint32_t flags;
-  uint8_t unused8[12];
-  int32_t linkState;
-  uint8_t unused24[4];
-  uint32_t size;  // bytes
-  char tardisk[128];
-  char ramdisk[128];
-  char name[256];
-};
-static_assert(sizeof(InodeRecord) == 544);
-static_assert(offsetof(InodeRecord, flags) == 4);
-static_assert(offsetof(InodeRecord, linkState) == 20);
-static_assert(offsetof(InodeRecord, size) == 28);
-static_assert(offsetof(InodeRecord, tardisk) == 32);
-static_assert(offsetof(InodeRecord, ramdisk) == 160);
-static_assert(offsetof(InodeRecord, name) == 288);
-
-constexpr size_t kNameSize = sizeof(InodeRecord::name);
+constexpr size_t kNameSize = sizeof(InodeStats::name);
 
 struct Inode {
   uint64_t number;  // the file system's; what several volumes number alike is told apart on top
@@ -322,9 +301,9 @@ KIF_Status GetInode(const NodeInfo &, const KIF_ParamList *instance, void *recor
       bsearch(&wanted, table->inodes.begin(), table->inodes.size(), sizeof(Inode), CompareNumbers));
   if (inode == nullptr) return KIF_STATUS_NOT_FOUND;
   const VolumeName &volume = table->volumes[inode->volume];
-  auto *stats = static_cast<InodeRecord *>(record);
-  stats->flags = volume.isTardisk ? kOnTardisk : 0;
-  stats->linkState = inode->deleted ? kUnlinked : 0;
+  auto *stats = static_cast<InodeStats *>(record);
+  stats->flags = volume.isTardisk ? kInodeOnTardisk : InodeFlags{};
+  stats->linkState = inode->deleted ? kInodeUnlinked : 0;
   stats->size = inode->size;
   memcpy(volume.isTardisk ? stats->tardisk : stats->ramdisk, volume.name, sizeof(volume.name));
   snprintf(stats->name, sizeof(stats->name), "%s", table->paths.text() + inode->path);

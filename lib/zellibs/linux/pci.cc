@@ -12,41 +12,14 @@
 #include "linux/linux_nodes.h"
 #include "linux/modules.h"
 #include "linux/pci_bus.h"
+#include "records/pci.h"
 
 namespace {
 
 constexpr uint8_t kDisplayClass = 3;  // a base class
 
-enum InfoFlag : uint8_t { kInterruptValid = 1, kSpawnedBusValid = 2 };
 enum HeaderType : uint8_t { kPlainFunction = 0, kPciBridge = 1, kCardBusBridge = 2 };
 enum MemberFlag : uint8_t { kBootConsole = 1, kOwnDriver = 2, kGivenToGuests = 4 };
-
-struct __attribute__((packed)) PciConfigHeader {
-  uint16_t vendorID;
-  uint16_t deviceID;
-  uint16_t subVendorID;
-  uint16_t subDeviceID;
-  uint16_t classCode;  // base class and subclass
-  uint8_t unused10[2];
-  uint8_t isaIrq;
-  uint8_t irq;
-  uint8_t vector;
-  uint8_t intPin;
-  uint8_t spawnedBus;
-  uint8_t infoFlags;
-  uint8_t mFlags;
-  uint32_t moduleID;
-  char name[33];
-  int32_t physSlot;
-  uint8_t unused60[68];
-};
-static_assert(sizeof(PciConfigHeader) == 128);
-static_assert(offsetof(PciConfigHeader, classCode) == 8);
-static_assert(offsetof(PciConfigHeader, isaIrq) == 12);
-static_assert(offsetof(PciConfigHeader, infoFlags) == 17);
-static_assert(offsetof(PciConfigHeader, moduleID) == 19);
-static_assert(offsetof(PciConfigHeader, name) == 23);
-static_assert(offsetof(PciConfigHeader, physSlot) == 56);
 
 // The standard part of a function's configuration space, which every reader may see.
 struct __attribute__((packed)) ConfigSpace {
@@ -228,9 +201,9 @@ bool IsBridge(const ConfigSpace &config) {
 void UseInterruptsAndBus(const ConfigSpace &config, bool hasMsi, PciConfigHeader *header) {
   header->isaIrq = config.interruptLine;
   header->intPin = static_cast<uint8_t>(config.interruptPin - 1);
-  if (config.interruptPin != 0 || hasMsi) header->infoFlags |= kInterruptValid;
+  if (config.interruptPin != 0 || hasMsi) header->infoFlags |= kPciInterruptValid;
   if (!IsBridge(config)) return;
-  header->infoFlags |= kSpawnedBusValid;
+  header->infoFlags |= kPciSpawnedBusValid;
   header->spawnedBus = config.secondaryBus;
 }
 

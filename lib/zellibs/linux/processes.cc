@@ -327,8 +327,8 @@ KIF_Status ReadMainThread(Process *process) {
   if (status != KIF_STATUS_OK) return status;
   FillProcess(stat, process);
   const auto place = static_cast<uint32_t>(picture->threads.size());
-  status = AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
-                        stat);
+  status =
+      AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id, stat);
   if (status != KIF_STATUS_OK) return status;
   process->mainThread = place;
   picture->threads[place].served = static_cast<uint8_t>(ThreadValue::kTimes);

@@ -7,9 +7,10 @@
 #include <cstdint>
 
 #include "kif/zellibs.h"
+#include "records/worlds.h"
 
 constexpr size_t kThreadNameSize = 64;  // proc(5): comm is cut to 15 bytes, kernel threads' to 63
-constexpr size_t kCommandLineSize = 1024;  // of the cartel's command line record
+constexpr size_t kCommandLineSize = sizeof(CartelCommandLine::text);
 
 struct Process {
   int32_t id;

@@ -3,12 +3,9 @@
 
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
-
-void PutNumber(void *record, size_t offset, uint32_t value) {
-  memcpy(static_cast<char *>(record) + offset, &value, sizeof(value));
-}
 
 // A load average as it stands in /proc/loadavg, "0.25", times 100.
 bool TakeHundredths(const char **text, uint32_t *hundredths) {
@@ -43,10 +40,11 @@ KIF_Status CountOnlineCpus(uint32_t *online) {
   return *online > 0 ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
 }
 
-KIF_Status PutOnlineCpus(void *record, size_t offset) {
+template <typename Record>
+KIF_Status PutOnlineCpus(Record *record) {
   uint32_t online;
   const KIF_Status status = CountOnlineCpus(&online);
-  if (status == KIF_STATUS_OK) PutNumber(record, offset, online);
+  if (status == KIF_STATUS_OK) record->numPcpus = online;
   return status;
 }
 
@@ -60,16 +58,16 @@ KIF_Status GetUpTime(const NodeInfo &, const KIF_ParamList *, void *record) {
   const char *place = text;
   uint64_t seconds;
   if (!TakeNumber(&place, &seconds)) return KIF_STATUS_IO_ERROR;
-  PutNumber(record, 0, static_cast<uint32_t>(seconds));
+  static_cast<UptimeRecord *>(record)->seconds = static_cast<uint32_t>(seconds);
   return KIF_STATUS_OK;
 }
 
 KIF_Status GetNumPcpus(const NodeInfo &, const KIF_ParamList *, void *record) {
-  return PutOnlineCpus(record, 4);
+  return PutOnlineCpus(static_cast<PcpuRecord *>(record));
 }
 
 KIF_Status GetCpuInfo(const NodeInfo &, const KIF_ParamList *, void *record) {
-  return PutOnlineCpus(record, 16);
+  return PutOnlineCpus(static_cast<CpuInfo *>(record));
 }
 
 // The whole machine is group 0; there are no others.
@@ -85,7 +83,7 @@ KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, v
   for (size_t i = 0; i < 3; ++i) {
     uint32_t hundredths;
     if (!TakeHundredths(&place, &hundredths)) return KIF_STATUS_IO_ERROR;
-    if (i == wanted) PutNumber(record, 4, hundredths);
+    if (i == wanted) static_cast<LoadHistoryRecord *>(record)->loadInPct = hundredths;
     while (*place == ' ') ++place;
   }
   return KIF_STATUS_OK;

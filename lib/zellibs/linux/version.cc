@@ -8,22 +8,9 @@
 #include "linux/files.h"
 #include "linux/kernel_release.h"
 #include "linux/linux_nodes.h"
+#include "records/platform.h"
 
 namespace {
-
-struct __attribute__((packed)) VersionRecord {
-  char product[32];
-  char version[64];
-  char releaseLevel[64];
-  char update[132];
-  int32_t buildNumber;
-  uint8_t unused296[16];
-};
-static_assert(sizeof(VersionRecord) == 312);
-static_assert(offsetof(VersionRecord, version) == 32);
-static_assert(offsetof(VersionRecord, releaseLevel) == 96);
-static_assert(offsetof(VersionRecord, update) == 160);
-static_assert(offsetof(VersionRecord, buildNumber) == 292);
 
 using Field = char[sizeof(utsname::release)];
 

@@ -6,30 +6,9 @@
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/processes.h"
+#include "records/worlds.h"
 
 namespace {
-
-struct __attribute__((packed)) WorldInfoRecord {
-  uint32_t worldID;
-  int32_t groupID;
-  uint32_t userspaceID;
-  uint32_t cartelID;
-  int32_t parentCartelID;
-  int32_t processGroupID;
-  int32_t sessionID;
-  uint32_t worldType;
-  unsigned char unused[13];
-  int32_t securityDomain;
-  unsigned char reserved[23];
-};
-static_assert(sizeof(WorldInfoRecord) == 72 && offsetof(WorldInfoRecord, securityDomain) == 45);
-
-enum WorldType : uint32_t {
-  kSystem = 0x1,
-  kUser = 0x4,
-  kVirtualMachineMonitor = 0x8,
-  kClone = 0x20,
-};
 
 // The run and wait states that a state letter of proc(5) stands for: places in the tables below.
 struct State {
@@ -80,10 +59,10 @@ bool IsVirtualCpu(const char *name) {
 }
 
 uint32_t TypeOf(const Thread &thread, const Process &process) {
-  if (process.isKernel) return kSystem;
-  uint32_t type = kUser;
-  if (thread.id != process.id) type |= kClone;
-  if (IsVirtualCpu(thread.name)) type |= kVirtualMachineMonitor;
+  if (process.isKernel) return kWorldTypeSystem;
+  uint32_t type = kWorldTypeUser;
+  if (thread.id != process.id) type |= kWorldTypeClone;
+  if (IsVirtualCpu(thread.name)) type |= kWorldTypeVmm;
   return type;
 }
 
@@ -129,7 +108,7 @@ KIF_Status GetWorldInfo(const NodeInfo &, const KIF_ParamList *instance, void *r
   const KIF_Status status =
       FindThread(FirstInteger(instance), ThreadValue::kInfo, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
-  auto *info = static_cast<WorldInfoRecord *>(record);
+  auto *info = static_cast<WorldInfo *>(record);
   info->worldID = static_cast<uint32_t>(thread->id);
   info->groupID = process->id;
   info->processGroupID = process->group;
@@ -152,8 +131,9 @@ KIF_Status GetSummaryStats(const NodeInfo &, const KIF_ParamList *instance, void
   for (const State &state : kStates) {
     if (state.letter == thread->state) found = state;
   }
-  memcpy(static_cast<char *>(record) + 4, &found.run, sizeof(found.run));
-  memcpy(static_cast<char *>(record) + 8, &found.wait, sizeof(found.wait));
+  auto *summary = static_cast<SchedSummary *>(record);
+  summary->runState = found.run;
+  summary->waitState = found.wait;
   return KIF_STATUS_OK;
 }
 
@@ -169,8 +149,7 @@ KIF_Status GetStateTimes(const NodeInfo &, const KIF_ParamList *instance, void *
       FindThread(FirstInteger(instance), ThreadValue::kTimes, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
   constexpr uint64_t kTicksPerSecond = 100;  // USER_HZ, the same on every architecture but one
-  const uint64_t microseconds = thread->cpuTicks * (1000000 / kTicksPerSecond);
-  memcpy(static_cast<char *>(record) + 8, &microseconds, sizeof(microseconds));
+  static_cast<SchedStateTimes *>(record)->usedTime = thread->cpuTicks * (1000000 / kTicksPerSecond);
   return KIF_STATUS_OK;
 }
 
@@ -191,7 +170,6 @@ KIF_Status GetChild(const NodeInfo &, const KIF_ParamList *instance, void *recor
   const Process *child;
   const KIF_Status status = FindChild(FirstInteger(instance), instance->params[1].integer, &child);
   if (status != KIF_STATUS_OK) return status;
-  const int32_t childState = child->isZombie ? 1 : 0;
-  memcpy(static_cast<char *>(record) + 4, &childState, sizeof(childState));
+  static_cast<ChildRecord *>(record)->childState = child->isZombie ? kChildStateZombie : 0;
   return KIF_STATUS_OK;
 }

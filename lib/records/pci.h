@@ -1,4 +1,4 @@
-// The records of the PCI nodes and of the kernel's modules, as the library delivers them.
+// The records of the PCI functions and of the kernel's modules (see worlds.h).
 #pragma once
 
 #include <cstddef>

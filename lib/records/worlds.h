@@ -1,5 +1,5 @@
-// The records of worlds and cartels as the platform library hands them out. They are packed; the
-// bytes named unused are the kernel's own.
+// The records of worlds and cartels. All records are the wire format between the platform library
+// and the program: packed and little-endian; the bytes named unused are the kernel's own.
 #pragma once
 
 #include <stddef.h>
@@ -87,3 +87,33 @@ static_assert(sizeof(ChildRecord) == 28);
 static_assert(offsetof(ChildRecord, childState) == 4);
 
 constexpr int32_t kChildStateZombie = 1;
+
+// KIF_NODE_userworld_cartel_fd_fds, for a cartel ID and a descriptor number.
+struct __attribute__((packed)) DescriptorRecord {
+  unsigned char unused0[4];
+  char kind[96];
+  char description[1984];
+};
+static_assert(sizeof(DescriptorRecord) == 2084);
+static_assert(offsetof(DescriptorRecord, kind) == 4 &&
+              offsetof(DescriptorRecord, description) == 100);
+
+// KIF_NODE_userworld_cartel_mem_mmaps, for a cartel ID and a mapping of its list.
+struct __attribute__((packed)) MappingRecord {
+  unsigned char unused0[8];
+  uint32_t length;  // in bytes
+  unsigned char unused12[4];
+  uint32_t kind;        // kMappingOfFile, or anything else
+  uint32_t protection;  // set of kMappingReadable, kMappingWritable
+  int32_t descriptor;
+  char description[2008];
+};
+static_assert(sizeof(MappingRecord) == 2036);
+static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
+              offsetof(MappingRecord, protection) == 20 &&
+              offsetof(MappingRecord, descriptor) == 24 &&
+              offsetof(MappingRecord, description) == 28);
+
+constexpr uint32_t kMappingOfFile = 2;
+constexpr uint32_t kMappingReadable = 0x1;
+constexpr uint32_t kMappingWritable = 0x2;

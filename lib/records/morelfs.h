@@ -1,16 +1,15 @@
 // The records of the in-memory file system: its volumes (tardisks, backed by archives, and
-// ramdisks, backed by memory) and its inodes.
+// ramdisks, backed by memory) and its inodes (see worlds.h).
 #pragma once
 
+#include <stddef.h>
 #include <stdint.h>
-
-#include "kif/kif.h"
 
 struct __attribute__((packed)) TardiskStats {
   uint32_t used;  // bytes
   uint8_t unused4[4];
-  uint8_t usedToBoot;  // not 0: one of the modules that the host was booted from
-  uint8_t unused9[19];
+  uint32_t usedToBoot;  // lowest byte not 0: one of the modules that the host was booted from
+  uint8_t unused12[16];
 };
 static_assert(sizeof(TardiskStats) == 28);
 static_assert(offsetof(TardiskStats, used) == 0);
@@ -54,12 +53,3 @@ static_assert(offsetof(InodeStats, size) == 28);
 static_assert(offsetof(InodeStats, tardisk) == 32);
 static_assert(offsetof(InodeStats, ramdisk) == 160);
 static_assert(offsetof(InodeStats, name) == 288);
-
-// Reads the statistics of the volume `name` from `node`, which must be the one of the Record.
-template <typename Record>
-KIF_Status ReadVolumeStats(KIF_NodeId node, const char *name, Record *record) {
-  const ParamListHandle instance = CreateInstance();
-  if (instance == nullptr) return KIF_STATUS_NO_MEMORY;
-  const KIF_Status status = KIF_ParamListAddString(instance.get(), name);
-  return status != 0 ? status : ReadRecord(node, instance.get(), record);
-}
