@@ -128,7 +128,7 @@ KIF_Status ReadStat(int directory, const char *path, Stat *stat) {
   return ParseStat(text, length, stat) ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
 }
 
-// The main thread's own file: that of the process adds up all its threads.
+// The main thread's own file: for that of the process the kernel adds up all its threads.
 KIF_Status ReadThreadStat(int32_t process, int32_t thread, Stat *stat) {
   char path[kPathSize];
   snprintf(path, sizeof(path), "%d/task/%d/stat", process, thread);
@@ -314,25 +314,18 @@ KIF_Status PlaceOfThread(int64_t id, uint32_t *found) {
 }
 
 // In a picture of cartels a process is read when it is asked for. One that has ended since counts
-// as a zombie. Its own file is reached in half the time of its main thread's and says the same, but
-// for the times: those count as given, so that who asks for them reads the thread's.
+// as a zombie.
 KIF_Status ReadMainThread(Process *process) {
   if (process->mainThread != kNoThread) return KIF_STATUS_OK;
-  char path[kPathSize];
   Stat stat;
-  snprintf(path, sizeof(path), "%d/stat", process->id);
-  KIF_Status status = ReadStat(picture->proc.fd(), path, &stat);
+  KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
   if (status == KIF_STATUS_OK && IsDead(stat.state)) status = KIF_STATUS_NOT_FOUND;
   process->isZombie = status == KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
   FillProcess(stat, process);
-  const auto place = static_cast<uint32_t>(picture->threads.size());
-  status =
-      AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id, stat);
-  if (status != KIF_STATUS_OK) return status;
-  process->mainThread = place;
-  picture->threads[place].served = static_cast<uint8_t>(ThreadValue::kTimes);
-  return KIF_STATUS_OK;
+  process->mainThread = static_cast<uint32_t>(picture->threads.size());
+  return AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
+                      stat);
 }
 
 // Reads what the userspaces of a picture of cartels are worked out from.
@@ -398,9 +391,10 @@ KIF_Status ReadCommandLineFile(int32_t id, char *text) {
 }
 
 // Kernel threads and zombies have no memory and so no program: one look at a link tells, where the
-// reader may look.
+// reader may look. KIF_STATUS_NOT_SUPPORTED where the rest of the process has to tell: a tree need
+// not hold the links, and what is in a process group is no kernel thread, which costs less to see.
 KIF_Status FindProgram(int32_t id) {
-  if (IsForeignRoot()) return KIF_STATUS_NO_PERMISSION;  // a tree need not hold the links
+  if (IsForeignRoot() || getpgid(id) > 0) return KIF_STATUS_NOT_SUPPORTED;
   char path[kPathSize];
   char program[2];
   snprintf(path, sizeof(path), "%d/exe", id);
