@@ -10,7 +10,10 @@ static_assert(offsetof(Data, length) == 0);
 
 KIFData *KIFData_Create(uint32_t capacity, const void *bytes, uint32_t length) {
   Data *data = nullptr;
-  if (length <= capacity) data = static_cast<Data *>(malloc(sizeof(Data) + size_t{capacity}));
+  const uint64_t size = sizeof(Data) + uint64_t{capacity};
+  if (length <= capacity && size <= PTRDIFF_MAX) {
+    data = static_cast<Data *>(malloc(static_cast<size_t>(size)));
+  }
   if (data != nullptr) {
     data->length = bytes != nullptr ? length : 0;
     data->capacity = capacity;

@@ -51,8 +51,9 @@ bool HasLiveHost() {
 }
 
 KIF_Status UseRecordedHost(const char *path) {
+  const bool live = Chosen().live;  // before the file is opened: this may open another one
   const Host *recorded = nullptr;
   const KIF_Status status = OpenRecordedHost(path, &recorded);
-  if (status == KIF_STATUS_OK) choice = {true, Chosen().live, status, recorded};
+  if (status == KIF_STATUS_OK) choice = {true, live, status, recorded};
   return status;
 }

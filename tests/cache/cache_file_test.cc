@@ -2,6 +2,7 @@
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include "cache_file.h"
@@ -102,6 +103,24 @@ TEST_F(CacheFiles, ThatCannotBeUsedSayWhy) {
     ASSERT_EQ(chmod(good.c_str(), 0), 0);
     EXPECT_EQ(StatusOf(good), KIF_STATUS_NO_PERMISSION);
   }
+}
+
+// The file that was asked for is the host, also before anything else was asked of the library.
+TEST_F(CacheFiles, TakeThePlaceOfTheLiveHost) {
+  const char kText[] = "record system_ntpclock_upTime = seconds=";
+  const std::string live = Record(kText + std::string("111\n"));
+  const std::string file = Record(kText + std::string("222\n"));
+  const pid_t child = fork();
+  if (child == 0) {
+    setenv("ZELLIBS_HOST", live.c_str(), 1);
+    uint32_t uptime[2] = {};
+    const bool used = LIBRARY(KIF_UseCache)(file.c_str(), 0) == 0 &&
+                      LIBRARY(KIF_Get)(kNode_system_ntpclock_upTime + 1, nullptr, uptime, 8) == 0;
+    _exit(used && uptime[0] == 222 ? 0 : 1);
+  }
+  int status = 1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
 }
 
 // A file of the given version, otherwise whole.
