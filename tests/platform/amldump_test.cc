@@ -100,11 +100,26 @@ TEST_F(AmldumpTest, OverwritesNothing) {
   EXPECT_EQ(Files(), (std::set<std::string>{"DSDT.aml", "SSDT.aml"}));
 }
 
-TEST_F(AmldumpTest, RefusesSignaturesThatAreNoFileNames) {
-  for (const char *signature :
-       {"../x", "/etc", "a/", ".", "..", "", "A\\x1b[m", "A\\x00B", "\\n"}) {
-    SCOPED_TRACE(signature);
-    ExpectRefusal(Tables({signature}), "amldump: the signature of a table is no file name\n");
+TEST_F(AmldumpTest, TakesAnySignatureButNoOtherDirectory) {
+  const Outcome outcome = Dump(Tables({"", "..", "A\\x1bB", "C\\x00D"}));
+  EXPECT_EQ(outcome.out,
+            "Writing file .aml\nWriting file ...aml\nWriting file A\x1b"
+            "B.aml\n"
+            "Writing file C.aml\n");
+  EXPECT_EQ(outcome.status, 0) << outcome.err;
+  EXPECT_EQ(Files(), (std::set<std::string>{".aml", "...aml",
+                                            "A\x1b"
+                                            "B.aml",
+                                            "C.aml"}));
+}
+
+TEST_F(AmldumpTest, StaysInItsDirectory) {
+  for (const std::string signature : {"../x", "/etc", "a/"}) {
+    const Outcome outcome = Dump(Tables({signature}));
+    EXPECT_EQ(outcome.out, "Writing file " + signature + ".aml\n");
+    EXPECT_EQ(outcome.err, "amldump: : No such file or directory\n");
+    EXPECT_EQ(outcome.status, 1);
+    EXPECT_TRUE(Files().empty());
   }
 }
 
