@@ -12,6 +12,8 @@
 #include <set>
 
 #include "kif/kif.h"
+#include "records/platform.h"
+#include "records/worlds.h"
 #include "redact.h"
 #include "status.h"
 
@@ -348,20 +350,37 @@ void Recorder::RecordContent(const NodeInfo &node, const Values &instance,
     if (content.readStatus != 0) content.bytes.clear();
   }
   if (options_.redact && content.readStatus == 0) {
-    content.bytes = RedactedContent();
+    content.bytes = Redacted();
     content.total = static_cast<uint32_t>(content.bytes.size());
   }
   model_->AddContent(IndexOf(node), instance, content);
 }
 
+// Puts `text` in the place of a text that stands in `size` bytes of a record.
+void ReplaceText(std::string text, char *field, size_t size) {
+  text.resize(std::min(text.size(), size - 1));
+  text.resize(size, '\0');
+  memcpy(field, text.data(), size);
+}
+
 void Recorder::Redact(NodeIndex node, std::string *record) const {
-  if (node != kNode_userworld_cartel_cmdline && node != kNode_system_bootCmdLine) return;
-  const std::string_view text(record->c_str());
-  std::string redacted =
-      node == kNode_system_bootCmdLine ? RedactBootCommandLine(text) : RedactCommandLine(text);
-  redacted.resize(std::min(redacted.size(), record->size() - 1));
-  redacted.resize(record->size(), '\0');
-  *record = std::move(redacted);
+  char *bytes = record->data();
+  switch (node) {
+    case kNode_userworld_cartel_cmdline:
+      return ReplaceText(RedactBehindFirstWord(bytes), bytes, record->size());
+    case kNode_system_bootCmdLine:
+      return ReplaceText(RedactBootCommandLine(bytes), bytes, record->size());
+    case kNode_system_bootMAC:
+      return ReplaceText(*bytes != '\0' ? Redacted() : "", bytes, record->size());
+    case kNode_userworld_cartel_fd_fds: {
+      auto *descriptor = reinterpret_cast<DescriptorRecord *>(bytes);
+      if (strncmp(descriptor->kind, "SOCKET", sizeof(descriptor->kind)) != 0) return;
+      return ReplaceText(RedactBehindFirstWord(descriptor->description), descriptor->description,
+                         sizeof(descriptor->description));
+    }
+    default:
+      return;
+  }
 }
 
 int64_t Now() {
@@ -369,9 +388,17 @@ int64_t Now() {
   return fixed != nullptr ? strtoll(fixed, nullptr, 10) : time(nullptr);
 }
 
+// The host may be a file or a tree of files from elsewhere. No node has the name of the machine,
+// but one has the release of its kernel: where that is not this machine's, nothing else here is
+// either.
 void TellOfMachine(Facts *facts) {
+  VersionRecord version = {};
   struct utsname names;
-  if (uname(&names) == 0) {
+  const bool isKnown = KIF_Get(KIF_NODE_system_version, nullptr, &version, sizeof(version)) == 0;
+  version.product[sizeof(version.product) - 1] = version.version[sizeof(version.version) - 1] = 0;
+  facts->system = version.product;
+  facts->release = version.version;
+  if (uname(&names) == 0 && (HostType_OSIsZLK() || !isKnown || facts->release == names.release)) {
     facts->name = names.nodename;
     facts->system = names.sysname;
     facts->release = names.release;

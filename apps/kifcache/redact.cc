@@ -23,10 +23,10 @@ std::string_view TakeWord(std::string_view *text) {
 
 }  // namespace
 
-std::string RedactCommandLine(std::string_view commandLine) {
-  const size_t blank = commandLine.find(' ');
-  std::string redacted(commandLine.substr(0, blank));
-  if (blank != commandLine.npos) redacted += std::string(" ") + kEllipsis;
+std::string RedactBehindFirstWord(std::string_view text) {
+  const size_t blank = text.find(' ');
+  std::string redacted(text.substr(0, blank));
+  if (blank != text.npos) redacted += std::string(" ") + kEllipsis;
   return redacted;
 }
 
@@ -46,6 +46,6 @@ std::string RedactBootCommandLine(std::string_view commandLine) {
   }
 }
 
-std::string RedactedContent() {
+std::string Redacted() {
   return kEllipsis;
 }

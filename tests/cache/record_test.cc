@@ -58,6 +58,7 @@ const char kHost[] =
     "record sched_groups_stats_cpuStatsDir_cpuLoadHistory_cpuLoadHistory1MinInPct 0 = "
     "loadInPct=7\n"
     "record system_bootCmdLine = commandLine=\"/boot/vmlinuz root=/dev/sda1 quiet -- a=b secret\"\n"
+    "record system_bootMAC = address=\"01-secret\"\n"
     "list system_bootOptionFiles = \"gone\" \"grub\" \"sealed\"\n"
     "content system_bootOptionFiles_content \"grub\" = \"linux root=x\\n\"\n"
     "content system_bootOptionFiles_content \"sealed\" = length 9 status 0xbad000f\n"
@@ -69,6 +70,9 @@ const char kHost[] =
     "record userworld_cartel_cmdline 1 = cmdline=\"/bin/init --key secret\"\n"
     "record userworld_cartel_cmdline 3 = cmdline=\"/bin/unlisted\"\n"
     "record userworld_cartel_cmdline 4 = status 0xbad0062\n"
+    "list userworld_cartel_fd_fds 1 = 3 4\n"
+    "record userworld_cartel_fd_fds 1 3 = kind=\"SOCKET\" description=\"TCP secret:22 (LISTEN)\"\n"
+    "record userworld_cartel_fd_fds 1 4 = kind=\"FILE\" description=\"/a file\"\n"
     "list world = 1 2 5 5\n"
     "record world_info 1 = worldID=1 cartelID=1\n"
     "record world_info 2 = worldID=2 cartelID=3\n"
@@ -97,6 +101,9 @@ TEST_F(Recording, KeepsPrivateThingsOutOnRequest) {
   EXPECT_NE(redacted.find("commandLine=\"/boot/vmlinuz root=… quiet -- …\"\n"), redacted.npos);
   EXPECT_NE(redacted.find("cmdline=\"/bin/init …\"\n"), redacted.npos);
   EXPECT_NE(redacted.find("cmdline=\"/bin/unlisted\"\n"), redacted.npos);
+  EXPECT_NE(redacted.find("description=\"TCP …\"\n"), redacted.npos);
+  EXPECT_NE(redacted.find("description=\"/a file\"\n"), redacted.npos);
+  EXPECT_NE(redacted.find("address=\"…\"\n"), redacted.npos);
   EXPECT_NE(redacted.find("system_bootOptionFiles_content \"grub\" = \"…\"\n"), redacted.npos);
   EXPECT_NE(redacted.find("userworld_cartel_cmdline 4 = status 0xbad0062\n"), redacted.npos);
 }
