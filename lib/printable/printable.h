@@ -6,6 +6,14 @@
 
 namespace printable {
 
+// Whether a sequence may begin with these two bytes: not a longer way to write a character, no half
+// of a pair of UTF-16 and nothing above U+10FFFF (RFC 3629, section 4).
+inline bool MayBegin(unsigned char first, unsigned char second) {
+  const unsigned char least = first == 0xe0 ? 0xa0 : first == 0xf0 ? 0x90 : 0x80;
+  const unsigned char most = first == 0xed ? 0x9f : first == 0xf4 ? 0x8f : 0xbf;
+  return second >= least && second <= most;
+}
+
 // Length of the valid UTF-8 sequence of two bytes or more that begins the `size` bytes at `text`;
 // 0 when there is none.
 inline size_t SequenceLength(const unsigned char *text, size_t size) {
@@ -13,8 +21,8 @@ inline size_t SequenceLength(const unsigned char *text, size_t size) {
                         : text[0] >= 0xe0 && text[0] <= 0xef ? 3
                         : text[0] >= 0xc2 && text[0] <= 0xdf ? 2
                                                              : 0;
-  if (length > size) return 0;
-  for (size_t i = 1; i < length; ++i) {
+  if (length == 0 || length > size || !MayBegin(text[0], text[1])) return 0;
+  for (size_t i = 2; i < length; ++i) {
     if ((text[i] & 0xc0) != 0x80) return 0;
   }
   return length;

@@ -2,7 +2,9 @@
 
 #include <fcntl.h>
 
+#include <algorithm>
 #include <cstring>
+#include <string_view>
 
 #include "status.h"
 
@@ -79,51 +81,77 @@ KIF_Status ParseLines(char *text, MountTable *table) {
   return KIF_STATUS_OK;
 }
 
-// Whether the directory `path` is `folder` or lies below it.
-bool LiesWithin(const char *path, const char *folder) {
-  const size_t length = strcmp(folder, "/") == 0 ? 0 : strlen(folder);
-  return strncmp(path, folder, length) == 0 && (path[length] == '/' || path[length] == '\0');
+// The mounts in two orders, so that the ones above, below and beside a mount are found without
+// looking at all of them: hosts of containers have thousands.
+struct MountIndex {
+  const MountTable *table;
+  Array<const Mount *> byId;
+  Array<const Mount *> byPlace;  // by the mount that they stand on, then by point
+};
+
+int ComparePlace(const Mount &mount, uint64_t parent, std::string_view point) {
+  if (mount.parent != parent) return mount.parent < parent ? -1 : 1;
+  return std::string_view(mount.point).compare(point);
+}
+
+KIF_Status MakeIndex(const MountTable &table, MountIndex *index) {
+  index->table = &table;
+  for (const Mount &mount : table.mounts) {
+    if (!index->byId.Append(&mount) || !index->byPlace.Append(&mount)) return KIF_STATUS_NO_MEMORY;
+  }
+  std::sort(index->byId.begin(), index->byId.end(),
+            [](const Mount *a, const Mount *b) { return a->id < b->id; });
+  std::sort(index->byPlace.begin(), index->byPlace.end(), [](const Mount *a, const Mount *b) {
+    return ComparePlace(*a, b->parent, b->point) < 0;
+  });
+  return KIF_STATUS_OK;
 }
 
 // The mount that a mount stands on; null for the root's, whose parent lies outside of the table.
-const Mount *FindParent(const MountTable &table, const Mount &mount) {
-  for (const Mount &other : table.mounts) {
-    if (other.id == mount.parent && &other != &mount) return &other;
-  }
-  return nullptr;
+const Mount *FindParent(const MountIndex &index, const Mount &mount) {
+  const Mount *const *found =
+      std::lower_bound(index.byId.begin(), index.byId.end(), mount.parent,
+                       [](const Mount *other, uint64_t id) { return other->id < id; });
+  const bool isThere = found != index.byId.end() && (*found)->id == mount.parent;
+  return isThere && *found != &mount ? *found : nullptr;
 }
 
-// Whether another mount stands on the mount's own point, so that nothing of it is seen.
-bool IsStackedOn(const MountTable &table, const Mount &mount) {
-  for (const Mount &other : table.mounts) {
-    if (other.parent == mount.id && &other != &mount && strcmp(other.point, mount.point) == 0) {
-      return true;
-    }
+// Whether a mount that is not the root's stands at `point` on the mount `parent`.
+bool HasMountAt(const MountIndex &index, uint64_t parent, std::string_view point) {
+  const Mount *const *found = std::lower_bound(
+      index.byPlace.begin(), index.byPlace.end(), parent,
+      [&](const Mount *other, uint64_t) { return ComparePlace(*other, parent, point) < 0; });
+  for (; found != index.byPlace.end() && ComparePlace(**found, parent, point) == 0; ++found) {
+    if ((*found)->id != parent) return true;
   }
   return false;
 }
 
+// Whether another mount stands on the mount's own point, so that nothing of it is seen.
+bool IsStackedOn(const MountIndex &index, const Mount &mount) {
+  return HasMountAt(index, mount.id, mount.point);
+}
+
 // Whether another mount on the same parent covers a folder on the way to the mount's point.
-bool IsCovered(const MountTable &table, const Mount &mount) {
-  for (const Mount &other : table.mounts) {
-    if (other.parent == mount.parent && other.id != other.parent &&
-        strcmp(other.point, mount.point) != 0 && LiesWithin(mount.point, other.point)) {
-      return true;
-    }
+bool IsCovered(const MountIndex &index, const Mount &mount) {
+  const std::string_view point = mount.point;
+  if (point.size() > 1 && HasMountAt(index, mount.parent, "/")) return true;
+  for (size_t slash = point.find('/', 1); slash != point.npos; slash = point.find('/', slash + 1)) {
+    if (HasMountAt(index, mount.parent, std::string_view(point.data(), slash))) return true;
   }
   return false;
 }
 
 // The way to a mount leads over the mounts below it. A table in the making may name mounts in a
 // circle, so the way ends when it is longer than the table.
-bool IsHidden(const MountTable &table, const Mount &mount) {
-  if (IsStackedOn(table, mount)) return true;
+bool IsHidden(const MountIndex &index, const Mount &mount) {
+  if (IsStackedOn(index, mount)) return true;
   const Mount *upper = &mount;
-  for (size_t steps = 0; steps < table.mounts.size(); ++steps) {
-    const Mount *lower = FindParent(table, *upper);
+  for (size_t steps = 0; steps < index.table->mounts.size(); ++steps) {
+    const Mount *lower = FindParent(index, *upper);
     if (lower == nullptr) return false;
-    if (IsCovered(table, *upper)) return true;
-    if (strcmp(lower->point, upper->point) != 0 && IsStackedOn(table, *lower)) return true;
+    if (IsCovered(index, *upper)) return true;
+    if (strcmp(lower->point, upper->point) != 0 && IsStackedOn(index, *lower)) return true;
     upper = lower;
   }
   return true;
@@ -148,6 +176,9 @@ KIF_Status ReadMounts(MountTable *table) {
   if (status == KIF_STATUS_OK) status = ParseLines(table->text.data(), table);
   if (status != KIF_STATUS_OK || table->mounts.size() == 0) return status;
   qsort(table->mounts.begin(), table->mounts.size(), sizeof(Mount), CompareMounts);
-  for (Mount &mount : table->mounts) mount.hidden = IsHidden(*table, mount);
+  MountIndex index = {};
+  status = MakeIndex(*table, &index);
+  if (status != KIF_STATUS_OK) return status;
+  for (Mount &mount : table->mounts) mount.hidden = IsHidden(index, mount);
   return KIF_STATUS_OK;
 }
