@@ -458,11 +458,14 @@ TEST_F(LsofTree, ReadsAnyTextOfMappings) {
         "7f0000000000-7f0200000000 -w-s 00000000 00:01 5 /dev/zero\x1b (deleted)\n"
         "10000000000000000-10000000000001000 r--p 00000000 00:01 5 /beyond\n"
         "7f0300000000-7f0300001000 r--p 00000000 00:01 5 " +
-            longName + "\n" + "ffffffffff600000-ffffffffff601000 --xp 00000000 00:00 0 /last");
+            longName +
+            "\n7f0400000000-7f0400001000 rw-s 00000000 00:0e 9 anon_inode:[perf_event]\n" +
+            "ffffffffff600000-ffffffffff601000 --xp 00000000 00:00 8 /last");
   ListTree();
   EXPECT_EQ(mappings_, (std::vector<std::string>{"/bin/a b (deleted) (prot:R-/len:4096)",
                                                  "/dev/zero? (deleted) (prot:-W/len:4294967295)",
                                                  longName.substr(0, 2007) + " (prot:R-/len:4096)",
+                                                 "anon_inode:[perf_event] (prot:RW/len:4096)",
                                                  "/last (prot:--/len:4096)"}));
 }
 

@@ -1,5 +1,6 @@
 // The interrupts, ACPI tables, boot facts, version and clock of a Linux machine: from trees of
 // files, and against this machine's own files.
+#include <sys/stat.h>
 #include <sys/utsname.h>
 #include <unistd.h>
 
@@ -150,10 +151,17 @@ TEST_F(PlatformHostTest, BootOptionFiles) {
   WriteFile("root/boot/loader/entries/.c.conf", "");
   WriteFile("root/boot/grub/grub.cfg", "set x\n");
   WriteFile("root/etc/shadow", "secret\n");
+  // What is no file is not listed; a link means a place in the tree.
+  const std::string entries = Scratch() + "/root/boot/loader/entries/";
+  std::filesystem::create_directory(entries + "folder.conf");
+  ASSERT_EQ(mkfifo((entries + "pipe.conf").c_str(), 0600), 0);
+  ASSERT_EQ(symlink("nowhere", (entries + "broken.conf").c_str()), 0);
+  ASSERT_EQ(symlink("/etc/kernel/cmdline", (entries + "c.conf").c_str()), 0);
+  ASSERT_EQ(symlink("/etc/hostname", (entries + "d.conf").c_str()), 0);
   EXPECT_EQ(OnTree({"bootOption", "-rb"}).out,
             "/boot/grub/grub.cfg /boot/loader/entries/a.conf /boot/loader/entries/b.conf "
-            "/etc/kernel/cmdline \n");
-  EXPECT_EQ(OnTree({"bootOption", "-rC"}).out, "set x   title b version 2  ro quiet  ");
+            "/boot/loader/entries/c.conf /etc/kernel/cmdline \n");
+  EXPECT_EQ(OnTree({"bootOption", "-rC"}).out, "set x   title b version 2  ro quiet  ro quiet  ");
   for (const char *other : {"/etc/shadow", "/boot/loader/entries/../../../etc/shadow.conf",
                             "/boot/loader/entries/x.conf", "/etc/default/grub"}) {
     const Outcome outcome = OnTree({"bootOption", "-rc", other});

@@ -146,4 +146,59 @@ TEST_F(PsLive, ContainersAreUserspaces) {
       << outcome.out;
 }
 
+// Trees of files, as another machine or nobody ever had them.
+class ProcessTree : public HostTest {
+ protected:
+  // A process or, with `thread`, another thread of it; `pidNamespace` 0: its link is missing.
+  void Add(int process, const std::string &name, char state, int parent, int threads,
+           const std::string &commandLine, int pidNamespace = 1, int thread = 0) {
+    const std::string id = std::to_string(process);
+    const std::string task = std::to_string(thread != 0 ? thread : process);
+    WriteFile("tree/proc/" + id + "/task/" + task + "/stat",
+              task + " (" + name + ") " + state + " " + std::to_string(parent) + " " + id + " " +
+                  id + " 0 -1 " + (name == "kernel" ? "2097152" : "0") + " 0 0 0 0 1 2 0 0 20 0 " +
+                  std::to_string(threads) + " 0 100 0 0\n");
+    if (thread != 0) return;
+    WriteFile("tree/proc/" + id + "/cmdline", commandLine);
+    if (pidNamespace == 0) return;
+    const std::string link = Scratch() + "/tree/proc/" + id + "/ns";
+    std::filesystem::create_directory(link);
+    const std::string target = "pid:[" + std::to_string(pidNamespace) + "]";
+    ASSERT_EQ(symlink(target.c_str(), (link + "/pid").c_str()), 0);
+  }
+  std::string Out(const std::vector<std::string> &arguments) {
+    return Linux(Scratch() + "/tree", arguments).out;
+  }
+};
+
+TEST_F(ProcessTree, CartelsAreUserProcessesThatLive) {
+  Add(1, "init", 'S', 0, 1, std::string("init\0", 5));
+  Add(2, "kernel", 'S', 0, 1, "kernel");
+  Add(3, "ended", 'Z', 1, 1, "ended");
+  EXPECT_EQ(Out({"pgrep", "-f", "."}), "1 \b\n");
+  EXPECT_EQ(Out({"pidof", "kernel", "ended", "init"}), "1 \n");
+}
+
+TEST_F(ProcessTree, ThreadsOutliveTheirMainThread) {
+  Add(1, "init", 'S', 0, 1, "init");
+  Add(5, "leader", 'Z', 1, 2, "", 2);
+  Add(5, "worker", 'S', 1, 2, "", 2, 6);
+  EXPECT_EQ(Out({"ps", "-U"}),
+            "WID  CID  WorldName  UserSpace\n"
+            "1  1  init    1        \n"
+            "6  5  worker  2        \n\n");
+}
+
+TEST_F(ProcessTree, TextsAreCutAndMadePrintable) {
+  // A control character written the long way, half of a pair of UTF-16, and what is beyond Unicode.
+  Add(1,
+      "a\xe0\x80\x9b"
+      "b\xed\xa0\x80"
+      "c\xf4\x90\x80\x80",
+      'S', 0, 1, std::string(1022, 'x') + std::string("\0more\0", 6));
+  EXPECT_EQ(Out({"ps", "-c"}),
+            "WID  CID  WorldName      Command\n1  1  a\xe0??b\xed\xa0?c\xf4???  " +
+                std::string(1022, 'x') + "\n\n");
+}
+
 }  // namespace

@@ -68,7 +68,8 @@ KIF_Status ReadTables() {
   KIF_Status status = AddFolder(0);
   if (status != KIF_STATUS_OK) return status;
   status = AddFolder(1);
-  if (status != KIF_STATUS_OK && status != KIF_STATUS_NOT_FOUND) return status;
+  const bool isClosed = status == KIF_STATUS_NOT_FOUND || status == KIF_STATUS_NO_PERMISSION;
+  if (status != KIF_STATUS_OK && !isClosed) return status;
   known->read = true;
   if (known->tables.size() > 0) {
     qsort(known->tables.begin(), known->tables.size(), sizeof(AcpiTable), CompareTables);
@@ -145,6 +146,6 @@ KIF_Status GetAcpiBuffer(const NodeInfo &, const KIF_ParamList *instance, void *
   status = ReadData(file, static_cast<off_t>(place) * kMostData, buffer);
   if (status != KIF_STATUS_OK) return status;
   if (buffer->length == 0) return KIF_STATUS_NOT_FOUND;
-  memcpy(buffer->signature, table->name, strnlen(table->name, kAcpiSignatureLength));
+  CopyText(buffer->signature, sizeof(buffer->signature), table->name, strlen(table->name));
   return KIF_STATUS_OK;
 }

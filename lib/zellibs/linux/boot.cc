@@ -92,11 +92,17 @@ KIF_Status OpenBootOptionFile(const char *path, Descriptor *file, struct stat *f
   return S_ISREG(facts->st_mode) ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
 }
 
+bool IsPlainFile(const char *path) {
+  Descriptor file;
+  struct stat facts;
+  return OpenHostFile(path, O_PATH, &file) == KIF_STATUS_OK && fstat(file.fd(), &facts) == 0 &&
+         S_ISREG(facts.st_mode);
+}
+
 template <size_t Count>
 KIF_Status ListExisting(const char *const (&paths)[Count], KIF_ParamList *list) {
   for (const char *path : paths) {
-    Descriptor file;
-    if (OpenHostFile(path, O_PATH, &file) != KIF_STATUS_OK) continue;
+    if (!IsPlainFile(path)) continue;
     const KIF_Status status = KIF_ParamListAddString(list, path);
     if (status != KIF_STATUS_OK) return status;
   }
@@ -116,6 +122,7 @@ KIF_Status ListEntries(KIF_ParamList *list) {
     if (!IsEntryName(name)) continue;
     char path[kEntriesLength + 256];
     snprintf(path, sizeof(path), "%s%s", kEntries, name);
+    if (!IsPlainFile(path)) continue;
     const KIF_Status status = KIF_ParamListAddString(list, path);
     if (status != KIF_STATUS_OK) return status;
   }

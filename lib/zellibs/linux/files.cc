@@ -2,7 +2,10 @@
 
 #include <errno.h>
 #include <fcntl.h>
+#include <linux/openat2.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include <cstring>
 
@@ -52,7 +55,12 @@ KIF_Status OpenHostFile(const char *path, int flags, Descriptor *file) {
   if (hostRoot == nullptr) return Opened(open(path, flags | O_CLOEXEC, 0), file);
   const Descriptor root(open(hostRoot, O_PATH | O_DIRECTORY | O_CLOEXEC));
   if (!root.valid()) return StatusOfErrno(errno);
-  return OpenBelow(root.fd(), path[1] != '\0' ? path + 1 : ".", flags, file);
+  // A link in the tree means a place in the tree, wherever the tree stands now.
+  open_how how = {};
+  how.flags = static_cast<unsigned>(flags) | O_CLOEXEC;
+  how.resolve = RESOLVE_IN_ROOT;
+  const long opened = syscall(SYS_openat2, root.fd(), path, &how, sizeof(how));
+  return Opened(static_cast<int>(opened), file);
 }
 
 KIF_Status OpenBelow(int directory, const char *path, int flags, Descriptor *file) {

@@ -18,6 +18,7 @@ struct Mapping {
   uint64_t start;
   uint64_t end;
   uint32_t protection;
+  bool hasFile;
   const char *name;
   size_t nameLength;
 };
@@ -72,6 +73,7 @@ bool ParseLine(const char *line, size_t length, Mapping *mapping) {
   mapping->protection =
       (place[0] == 'r' ? kMappingReadable : 0u) | (place[1] == 'w' ? kMappingWritable : 0u);
   for (int field = 0; field < 4; ++field) {
+    mapping->hasFile = place[0] != '0';  // the last of the four is the file's inode
     place += strcspn(place, " \n");
     place += strspn(place, " ");
   }
@@ -136,7 +138,7 @@ KIF_Status GetMapping(const NodeInfo &, const KIF_ParamList *instance, void *rec
   if (!FindMapping(static_cast<uint64_t>(start), &mapping)) return KIF_STATUS_NOT_FOUND;
   const uint64_t length = mapping.end - mapping.start;
   filled->length = length < UINT32_MAX ? static_cast<uint32_t>(length) : UINT32_MAX;
-  filled->kind = mapping.nameLength > 0 && mapping.name[0] == '/' ? kMappingOfFile : kOther;
+  filled->kind = mapping.hasFile ? kMappingOfFile : kOther;
   filled->protection = mapping.protection;
   filled->descriptor = -1;
   CopyText(filled->description, sizeof(filled->description), mapping.name, mapping.nameLength);

@@ -160,10 +160,16 @@ KIF_Status WalkVolume(Walk *walk, uint32_t place) {
   return status;
 }
 
-bool FindVolumeOf(const VolumeTable &volumes, const struct stat &facts, uint32_t *place) {
+// Finds the volume of the file behind a descriptor, without asking a file server that may not
+// answer for more than the kernel knows.
+bool FindVolumeOf(const VolumeTable &volumes, int descriptors, const char *name, uint32_t *place) {
+  struct statx facts;
+  const int flags = AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT;
+  if (statx(descriptors, name, flags, STATX_TYPE, &facts) != 0) return false;
   for (uint32_t i = 0; i < volumes.volumes.size(); ++i) {
+    const Mount &mount = *volumes.volumes[i].mount;
     *place = i;
-    if (IsOnVolume(facts, *volumes.volumes[i].mount)) return true;
+    if (facts.stx_dev_major == mount.major && facts.stx_dev_minor == mount.minor) return true;
   }
   return false;
 }
@@ -180,8 +186,8 @@ KIF_Status AddIfDeleted(const VolumeTable &volumes, int descriptors, const char 
   }
   struct stat facts;
   uint32_t place;
-  if (fstatat(descriptors, name, &facts, AT_NO_AUTOMOUNT) != 0 || facts.st_nlink != 0 ||
-      !FindVolumeOf(volumes, facts, &place)) {
+  if (!FindVolumeOf(volumes, descriptors, name, &place) ||
+      fstatat(descriptors, name, &facts, AT_NO_AUTOMOUNT) != 0 || facts.st_nlink != 0) {
     return KIF_STATUS_OK;
   }
   target[length - kDeletedLength] = '\0';

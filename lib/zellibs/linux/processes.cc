@@ -231,11 +231,14 @@ KIF_Status AppendOtherThreads(uint32_t place) {
 
 KIF_Status AppendProcess(int32_t id, bool withThreads) {
   Process process = NewProcess(id);
-  Stat stat;
+  Stat stat = {};
   const KIF_Status read = ReadThreadStat(id, id, &stat);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
-  if (read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone, or not for this reader
-  FillProcess(stat, &process);
+  if (read == KIF_STATUS_OK) {
+    FillProcess(stat, &process);
+  } else if (read != KIF_STATUS_NO_PERMISSION) {
+    return KIF_STATUS_OK;  // gone
+  }
   const auto place = static_cast<uint32_t>(picture->processes.size());
   if (!process.isZombie) {
     process.mainThread = static_cast<uint32_t>(picture->threads.size());
@@ -379,15 +382,14 @@ KIF_Status ReadCommandLineFile(int32_t id, char *text) {
   snprintf(path, sizeof(path), "%d/cmdline", id);
   const KIF_Status status = ReadPieceBelow(picture->proc.fd(), path, raw, sizeof(raw), &length);
   text[0] = '\0';
-  if (status == KIF_STATUS_NOT_FOUND) return KIF_STATUS_NO_COMMAND_LINE;
   if (status != KIF_STATUS_OK) return status;
   for (size_t i = 0; i < length; ++i) {
     if (raw[i] == '\0') raw[i] = ' ';
   }
-  while (length > 0 && raw[length - 1] == ' ') --length;
-  if (length == 0) return KIF_STATUS_NO_COMMAND_LINE;
   CopyText(text, kCommandLineSize, raw, length);
-  return KIF_STATUS_OK;
+  length = strlen(text);
+  while (length > 0 && text[length - 1] == ' ') text[--length] = '\0';
+  return length > 0 ? KIF_STATUS_OK : KIF_STATUS_NO_COMMAND_LINE;
 }
 
 // Kernel threads and zombies have no memory and so no program: one look at a link tells, where the
@@ -419,8 +421,11 @@ KIF_Status AppendCartel(int32_t id) {
   if (read == KIF_STATUS_OK) {
     process.commandLine = static_cast<uint32_t>(picture->commandLines.size());
     if (!picture->commandLines.Append(text, strlen(text) + 1)) return KIF_STATUS_NO_MEMORY;
-  } else if (program != KIF_STATUS_OK) {
-    if (TellByStat(&process) != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
+  }
+  // In a tree of files a command line proves nothing.
+  if ((read != KIF_STATUS_OK && program != KIF_STATUS_OK) || IsForeignRoot()) {
+    const KIF_Status told = TellByStat(&process);
+    if (told != KIF_STATUS_OK && read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
     if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
   }
   return picture->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
@@ -517,6 +522,7 @@ KIF_Status FindThread(int64_t id, ThreadValue value, const Thread **thread,
   KIF_Status status = LookUpThread(id, value, &place);
   if (status != KIF_STATUS_OK) return status;
   Thread &found = picture->threads[place];
+  if (!picture->processes[found.process].hasStat) return KIF_STATUS_NO_PERMISSION;
   const auto bit = static_cast<uint8_t>(value);
   if ((found.served & bit) != 0) {
     status = RefreshThread(&found);
@@ -567,7 +573,10 @@ KIF_Status ReadCommandLine(int64_t id, char *text) {
     return KIF_STATUS_OK;
   }
   if (lastCommandLine.process != id || !lastCommandLine.current) {
-    lastCommandLine.status = ReadCommandLineFile(static_cast<int32_t>(id), lastCommandLine.text);
+    KIF_Status status = ReadCommandLineFile(static_cast<int32_t>(id), lastCommandLine.text);
+    // One that was listed has ended since, which is no failure to whoever walks the list.
+    if (status == KIF_STATUS_NOT_FOUND && process != nullptr) status = KIF_STATUS_NO_COMMAND_LINE;
+    lastCommandLine.status = status;
     lastCommandLine.process = id;
   }
   lastCommandLine.current = false;

@@ -29,7 +29,12 @@ uint64_t ReadPidNamespace(int proc, const char *path) {
 }
 
 bool IsUser(const Process &process) {
-  return !process.isKernel;
+  return process.hasStat && !process.isKernel;
+}
+
+// A process may go on without its main thread, which is then a zombie.
+bool HasEnded(const Process &process) {
+  return process.isZombie && process.threads <= 1;
 }
 
 // The place of a process by ID, or `count`.
@@ -44,7 +49,7 @@ size_t PlaceOf(const Process *processes, size_t count, int32_t id) {
 void ReadPidNamespaces(int proc, Process *processes, size_t count) {
   char path[32];
   for (size_t i = 0; i < count; ++i) {
-    if (!IsUser(processes[i]) || processes[i].isZombie) continue;
+    if (!IsUser(processes[i]) || HasEnded(processes[i])) continue;
     snprintf(path, sizeof(path), "%d/ns/pid", processes[i].id);
     processes[i].pidNamespace = ReadPidNamespace(proc, path);
   }
@@ -90,7 +95,7 @@ KIF_Status NumberUserspaces(int proc, Process *processes, size_t count,
     // What nothing tells the namespace of is seen by the reader, in the reader's.
     if (process.pidNamespace == 0) process.pidNamespace = own;
     process.userspace = NumberOf(*userspaces, process.pidNamespace);
-    if (process.userspace == 0 && !process.isZombie) {
+    if (process.userspace == 0 && !HasEnded(process)) {
       const auto place = static_cast<uint32_t>(i);
       if (!userspaces->Append({process.pidNamespace, kNoRoot, place})) return KIF_STATUS_NO_MEMORY;
       process.userspace = static_cast<uint32_t>(userspaces->size());
