@@ -12,6 +12,7 @@
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "linux/process_directory.h"
 #include "linux/sockets.h"
 #include "records/worlds.h"
 
@@ -27,12 +28,6 @@ struct KeptProcess {
 
 Everlasting<KeptProcess> kept;
 
-constexpr size_t kPathSize = 32;
-
-void MakePath(int64_t process, char *path) {
-  snprintf(path, kPathSize, "/proc/%lld/fd", static_cast<long long>(process));
-}
-
 void Keep(int64_t process, int descriptors) {
   kept->id = process;
   kept->descriptors.Reset(descriptors);
@@ -41,10 +36,12 @@ void Keep(int64_t process, int descriptors) {
 
 KIF_Status KeepProcess(int64_t process) {
   if (process == kept->id) return KIF_STATUS_OK;
-  char path[kPathSize];
-  MakePath(process, path);
+  int directory;
   Descriptor descriptors;
-  const KIF_Status status = OpenHostFile(path, O_PATH | O_DIRECTORY, &descriptors);
+  KIF_Status status = OpenProcessDirectory(process, false, &directory);
+  if (status == KIF_STATUS_OK) {
+    status = OpenBelow(directory, "fd", O_PATH | O_DIRECTORY, &descriptors);
+  }
   if (status == KIF_STATUS_OK) Keep(process, descriptors.Release());
   return status;
 }
@@ -100,9 +97,9 @@ const char *KindOf(const char *name, const char *target) {
 
 KIF_Status ReadSocketsOfKept() {
   if (kept->socketsRead) return KIF_STATUS_OK;
-  Descriptor process;
-  KIF_Status status = OpenBelow(kept->descriptors.fd(), "..", O_PATH | O_DIRECTORY, &process);
-  if (status == KIF_STATUS_OK) status = ReadSocketsOf(process.fd());
+  int directory;
+  KIF_Status status = OpenProcessDirectory(kept->id, false, &directory);
+  if (status == KIF_STATUS_OK) status = ReadSocketsOf(directory);
   kept->socketsRead = status == KIF_STATUS_OK;
   return status;
 }
@@ -129,10 +126,10 @@ KIF_Status ReadLink(const char *name, char *text, size_t size, size_t *length) {
 KIF_Status ListDescriptors(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
   int64_t process;
   if (!IntegerAt(parent, 0, &process)) return KIF_STATUS_BAD_PARAMETER;
-  char path[kPathSize];
-  MakePath(process, path);
+  int directory;
   DirectoryReader descriptors;
-  KIF_Status status = descriptors.Open(path);
+  KIF_Status status = OpenProcessDirectory(process, true, &directory);
+  if (status == KIF_STATUS_OK) status = descriptors.OpenBelow(directory, "fd");
   if (status != KIF_STATUS_OK) return status;
   const int duplicate = fcntl(descriptors.fd(), F_DUPFD_CLOEXEC, 0);
   if (duplicate < 0) return StatusOfErrno(errno);

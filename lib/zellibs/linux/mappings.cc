@@ -4,10 +4,12 @@
 
 #include <cstddef>
 #include <cstring>
+#include <initializer_list>
 
 #include "linux/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "linux/process_directory.h"
 #include "records/worlds.h"
 
 namespace {
@@ -32,14 +34,24 @@ struct KeptMaps {
 
 Everlasting<KeptMaps> kept;
 
+// The directory that is open may be that of a process that had the same number.
+KIF_Status OpenMaps(int64_t process, Descriptor *file) {
+  KIF_Status status = KIF_STATUS_NOT_FOUND;
+  for (const bool fresh : {false, true}) {
+    int directory;
+    status = OpenProcessDirectory(process, fresh, &directory);
+    if (status == KIF_STATUS_OK) status = OpenBelow(directory, "maps", O_RDONLY, file);
+    if (status != KIF_STATUS_NOT_FOUND) break;
+  }
+  return status;
+}
+
 KIF_Status ReadMaps(int64_t process) {
-  char path[32];
-  snprintf(path, sizeof(path), "/proc/%lld/maps", static_cast<long long>(process));
   kept->process = -1;
   kept->text.Clear();
   kept->next = 0;
   Descriptor file;
-  KIF_Status status = OpenHostFile(path, O_RDONLY, &file);
+  KIF_Status status = OpenMaps(process, &file);
   if (status == KIF_STATUS_OK) status = kept->text.ReadAll(file.fd());
   if (status == KIF_STATUS_OK) kept->process = process;
   return status;
