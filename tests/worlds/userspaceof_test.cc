@@ -32,12 +32,13 @@ TEST_F(UserspaceofTest, PrintsEveryWorldOfTheId) {
   Expect("6", "", 1);
   Expect("4294967291", "5 \n", 0);
   Expect("-5", "5 \n", 0);
+  Expect("-4294967295", "11 \n", 0);
 }
 
 TEST_F(UserspaceofTest, RefusesWhatIsNoId) {
   for (const char *text : {"0", "", "-h", "-0", "x1", "\xb2"}) Expect(text, "bad world ID\n", 1);
   // Never the ID that remains of one that is too large.
-  for (const char *text : {"4294967297", "-4294967295", "18446744073709551617",
+  for (const char *text : {"4294967297", "-4294967297", "18446744073709551617",
                            "-18446744073709551615", "4294967296"}) {
     Expect(text, "", 1);
   }

@@ -284,8 +284,9 @@ struct Level {
   KIF_NodeId node;
 };
 
-// Lists what is below the selected instance of the level above `level`.
-bool ListLevel(Listing *listing, int level) {
+// Lists what is below the instance that `above` is at (null: the top), and takes it off the
+// selecting list.
+bool ListLevel(Listing *listing, int level, InstanceWalk *above) {
   const Level kLevels[] = {
       {"seg", KIF_NODE_hardware_pci_seg},
       {"bus", KIF_NODE_hardware_pci_seg_bus},
@@ -304,10 +305,12 @@ bool ListLevel(Listing *listing, int level) {
   InstanceWalk walk(instances.get(), selector);
   while (walk.Next()) {
     const bool listed =
-        level == kFunctionLevel ? ShowFunction(listing) : ListLevel(listing, level + 1);
+        level == kFunctionLevel ? ShowFunction(listing) : ListLevel(listing, level + 1, &walk);
     if (!listed) return false;
   }
-  return !walk.failed();
+  if (walk.failed()) return false;
+  if (above != nullptr) above->TakeOff();  // before the list goes
+  return true;
 }
 
 bool ListPCI(const Options &options) {
@@ -316,7 +319,7 @@ bool ListPCI(const Options &options) {
     fputs("ListPCI: Not enough memory\n", stderr);
     return false;
   }
-  return ListLevel(&listing, 0);
+  return ListLevel(&listing, 0, nullptr);
 }
 
 }  // namespace

@@ -9,11 +9,12 @@
 
 namespace {
 
-// As strtoul where a long has the 32 bits of a world ID: a minus sign gives the ID that has the
-// same bits, and what does not fit is the largest ID.
+// As strtoul where a long has the 32 bits of a world ID: a minus sign negates within them, and what
+// has too many digits for them is the largest ID.
 uint32_t ParseWorldId(const char *text) {
   const long long value = strtoll(text, nullptr, 10);
-  return value < INT32_MIN || value > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(value);
+  const bool fits = value >= -int64_t{UINT32_MAX} && value <= UINT32_MAX;
+  return fits ? static_cast<uint32_t>(value) : UINT32_MAX;
 }
 
 // Prints the userspace of every world with this ID. False when there is none, or the walk failed.
