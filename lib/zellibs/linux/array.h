@@ -42,6 +42,7 @@ class Array {
  private:
   bool Grow() {
     const size_t capacity = capacity_ == 0 ? 64 : capacity_ * 2;
+    // NOLINTNEXTLINE(bugprone-sizeof-expression): the items may be pointers
     void *grown = realloc(items_, capacity * sizeof(T));
     if (grown == nullptr) return false;
     items_ = static_cast<T *>(grown);
