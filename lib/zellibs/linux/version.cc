@@ -58,20 +58,18 @@ void PutText(char (&field)[Size], const char *text) {
   CopyText(field, Size, text, strlen(text));
 }
 
-// Splits `text` at blanks and keeps the last `Count` words; gives how many there are of them.
+// Splits `text` at blanks and keeps the last `Count` words; false where there are fewer.
 template <size_t Count>
-size_t LastWords(char *text, const char *(&words)[Count]) {
-  size_t count = 0;
-  char *rest;
-  for (char *word = strtok_r(text, " ", &rest); word != nullptr;
-       word = strtok_r(nullptr, " ", &rest)) {
-    if (count == Count) {
-      memmove(&words[0], &words[1], sizeof(words) - sizeof(words[0]));
-      --count;
-    }
-    words[count++] = word;
+bool LastWords(char *text, const char *(&words)[Count]) {
+  char *end = text + strlen(text);
+  for (size_t i = Count; i > 0; --i) {
+    while (end > text && end[-1] == ' ') --end;
+    *end = '\0';
+    while (end > text && end[-1] != ' ') --end;
+    words[i - 1] = end;
+    if (*end == '\0') return false;
   }
-  return count;
+  return true;
 }
 
 }  // namespace
@@ -110,7 +108,7 @@ KIF_Status GetKernelBuildDate(char *date) {
   memcpy(date, kUnknown, sizeof(kUnknown));
   utsname name;
   const char *words[5];  // month, day, time, zone, year
-  if (ReadNames(&name) != KIF_STATUS_OK || LastWords(name.version, words) != 5) {
+  if (ReadNames(&name) != KIF_STATUS_OK || !LastWords(name.version, words)) {
     return KIF_STATUS_OK;
   }
   const size_t day = strlen(words[1]);

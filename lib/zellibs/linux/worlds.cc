@@ -1,6 +1,5 @@
 // The subtrees world, sched_Vcpus and userworld_cartel: threads as worlds, processes as cartels.
 #include <cstddef>
-#include <cstdio>
 #include <cstring>
 
 #include "linux/files.h"
@@ -53,9 +52,10 @@ int64_t FirstInteger(const KIF_ParamList *instance) {
 
 // KVM names the threads of a guest's processors "CPU 0/KVM".
 bool IsVirtualCpu(const char *name) {
-  unsigned number;
-  int end = 0;
-  return sscanf(name, "CPU %u/KVM%n", &number, &end) == 1 && end > 0 && name[end] == '\0';
+  uint64_t number;
+  if (strncmp(name, "CPU ", 4) != 0) return false;
+  name += 4;
+  return TakeNumber(&name, &number) && strcmp(name, "/KVM") == 0;
 }
 
 uint32_t TypeOf(const Thread &thread, const Process &process) {
