@@ -276,9 +276,16 @@ KIF_Status ReadSocketsOf(int process) {
   KIF_Status status = OpenTables(process, &net);
   if (status == KIF_STATUS_NO_RESOURCES) return status;
   if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
-  if (!sockets->namespaces.Append(number)) return KIF_STATUS_NO_MEMORY;
+  const size_t before = sockets->byInode.size();
   for (uint8_t table = 0; status == KIF_STATUS_OK && table < std::size(kTables); ++table) {
     status = ReadTable(net.fd(), table);
+  }
+  // A process that ended meanwhile showed a part of them at most; the next one is asked.
+  uint64_t still;
+  if (NamespaceOf(process, &still) != KIF_STATUS_OK || still != number) {
+    sockets->byInode.Truncate(before);
+  } else if (!sockets->namespaces.Append(number)) {
+    status = KIF_STATUS_NO_MEMORY;
   }
   std::sort(sockets->byInode.begin(), sockets->byInode.end(), [](const Socket &a, const Socket &b) {
     return a.inode != b.inode ? a.inode < b.inode : a.line < b.line;
