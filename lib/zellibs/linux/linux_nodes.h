@@ -17,13 +17,13 @@ KIF_Status GetUpTime(const NodeInfo &node, const KIF_ParamList *instance, void *
 KIF_Status GetNumPcpus(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetCpuInfo(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, void *record);
+KIF_Status GetAffinity(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 
 // worlds.cc
 KIF_Status ListWorlds(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status GetWorldName(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetWorldInfo(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetSummaryStats(const NodeInfo &node, const KIF_ParamList *instance, void *record);
-KIF_Status GetAffinity(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status GetStateTimes(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 KIF_Status ListCartels(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list);
 KIF_Status GetCommandLine(const NodeInfo &node, const KIF_ParamList *instance, void *record);

@@ -1,9 +1,7 @@
 #include "linux/processes.h"
 
 #include <fcntl.h>
-#include <sched.h>
 #include <stdio.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -444,49 +442,6 @@ KIF_Status IndexChildren() {
   return KIF_STATUS_OK;
 }
 
-// A mask of CPUs as a list of ranges.
-void FormatCpus(const unsigned char *mask, size_t maskSize, char *text, size_t size) {
-  const auto isSet = [&](size_t cpu) {
-    return cpu < maskSize * 8 && (mask[cpu / 8] >> (cpu % 8) & 1) != 0;
-  };
-  size_t length = 0;
-  text[0] = '\0';
-  for (size_t first = 0; first < maskSize * 8; ++first) {
-    if (!isSet(first)) continue;
-    size_t last = first;
-    while (isSet(last + 1)) ++last;
-    const char *comma = length > 0 ? "," : "";
-    const int wanted =
-        first == last ? snprintf(text + length, size - length, "%s%zu", comma, first)
-                      : snprintf(text + length, size - length, "%s%zu-%zu", comma, first, last);
-    if (wanted < 0 || static_cast<size_t>(wanted) >= size - length) {
-      text[length] = '\0';
-      return;
-    }
-    length += static_cast<size_t>(wanted);
-    first = last;
-  }
-}
-
-// In a tree taken from elsewhere the kernel's own list stands in the thread's status.
-KIF_Status ReadRecordedCpus(const Process &process, int64_t thread, char *text, size_t size) {
-  char path[kPathSize];
-  char status[8192];
-  snprintf(path, sizeof(path), "%d/task/%lld/status", process.id, static_cast<long long>(thread));
-  KIF_Status read = ReadBelow(picture->proc.fd(), path, status, sizeof(status));
-  if (read == KIF_STATUS_NOT_FOUND && process.id == thread) {
-    snprintf(path, sizeof(path), "%d/status", process.id);
-    read = ReadBelow(picture->proc.fd(), path, status, sizeof(status));
-  }
-  if (read != KIF_STATUS_OK) return read;
-  static constexpr char kKey[] = "\nCpus_allowed_list:\t";
-  const char *list = strstr(status, kKey);
-  if (list == nullptr) return KIF_STATUS_NOT_FOUND;
-  list += sizeof(kKey) - 1;
-  CopyText(text, size, list, strcspn(list, "\n"));
-  return KIF_STATUS_OK;
-}
-
 }  // namespace
 
 KIF_Status TakeThreads(const Thread **threads, size_t *count) {
@@ -582,26 +537,4 @@ KIF_Status ReadCommandLine(int64_t id, char *text) {
   lastCommandLine.current = false;
   strcpy(text, lastCommandLine.text);
   return lastCommandLine.status;
-}
-
-KIF_Status ReadAllowedCpus(int64_t id, char *text, size_t size) {
-  if (IsForeignRoot()) {
-    uint32_t place;
-    const KIF_Status status = LookUpThread(id, ThreadValue::kState, &place);
-    if (status != KIF_STATUS_OK) return status;
-    return ReadRecordedCpus(picture->processes[picture->threads[place].process], id, text, size);
-  }
-  if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
-  unsigned char mask[8192 / 8] = {};  // NR_CPUS is at most 8192
-  static unsigned char lastMask[sizeof(mask)];
-  static char lastText[2304];
-  // The system call itself tells how much of the mask the kernel has; libc's wrapper does not.
-  const long given = syscall(SYS_sched_getaffinity, static_cast<pid_t>(id), sizeof(mask), mask);
-  if (given < 0) return StatusOfErrno(errno);
-  if (lastText[0] == '\0' || memcmp(mask, lastMask, sizeof(mask)) != 0) {
-    memcpy(lastMask, mask, sizeof(mask));
-    FormatCpus(mask, static_cast<size_t>(given), lastText, sizeof(lastText));
-  }
-  snprintf(text, size, "%s", lastText);
-  return KIF_STATUS_OK;
 }

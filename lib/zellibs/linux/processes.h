@@ -41,7 +41,7 @@ constexpr uint32_t kNoThread = UINT32_MAX;
 constexpr uint32_t kNoCommandLine = UINT32_MAX;
 
 // What of a thread a reader asks for.
-enum class ThreadValue : uint8_t { kName = 1, kInfo = 2, kState = 4, kTimes = 8 };
+enum class ThreadValue : uint8_t { kName = 1, kInfo = 2, kState = 4, kTimes = 8, kCpus = 16 };
 
 // Takes a new picture of every thread, and gives the threads to list: processes ascending, each
 // one's main thread first, no zombies. The pointers live until the next picture.
@@ -69,6 +69,3 @@ KIF_Status FindChild(int64_t parent, int64_t child, const Process **process);
 // The command line of a process, as the record has it: at most kCommandLineSize - 1 bytes and a
 // NUL. KIF_STATUS_NO_COMMAND_LINE where it has none, or has gone.
 KIF_Status ReadCommandLine(int64_t id, char *text);
-
-// The allowed CPUs of a thread as a list, "0-3,8", into `size` bytes.
-KIF_Status ReadAllowedCpus(int64_t id, char *text, size_t size);

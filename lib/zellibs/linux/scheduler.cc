@@ -1,9 +1,17 @@
-// system_ntpclock_upTime, sched_globalStats, sched_groups (load averages) and hardware_cpu.
+// system_ntpclock_upTime, sched_globalStats, sched_groups (load averages), the CPUs that a world
+// may run on, and hardware_cpu.
+#include <errno.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cstdio>
 #include <cstring>
 
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
+#include "linux/processes.h"
 #include "records/platform.h"
+#include "records/worlds.h"
 
 namespace {
 
@@ -48,6 +56,70 @@ KIF_Status PutOnlineCpus(Record *record) {
   return status;
 }
 
+// A mask of CPUs as a list of ranges.
+void FormatCpus(const unsigned char *mask, size_t maskSize, char *text, size_t size) {
+  const auto isSet = [&](size_t cpu) {
+    return cpu < maskSize * 8 && (mask[cpu / 8] >> (cpu % 8) & 1) != 0;
+  };
+  size_t length = 0;
+  text[0] = '\0';
+  for (size_t first = 0; first < maskSize * 8; ++first) {
+    if (!isSet(first)) continue;
+    size_t last = first;
+    while (isSet(last + 1)) ++last;
+    const char *comma = length > 0 ? "," : "";
+    const int wanted =
+        first == last ? snprintf(text + length, size - length, "%s%zu", comma, first)
+                      : snprintf(text + length, size - length, "%s%zu-%zu", comma, first, last);
+    if (wanted < 0 || static_cast<size_t>(wanted) >= size - length) {
+      text[length] = '\0';
+      return;
+    }
+    length += static_cast<size_t>(wanted);
+    first = last;
+  }
+}
+
+// In a tree taken from elsewhere the kernel's own list stands in the thread's status.
+KIF_Status ReadRecordedCpus(int64_t thread, char *text, size_t size) {
+  const Thread *found;
+  const Process *process;
+  KIF_Status read = FindThread(thread, ThreadValue::kCpus, &found, &process);
+  if (read != KIF_STATUS_OK) return read;
+  char path[64];
+  char status[8192];
+  snprintf(path, sizeof(path), "/proc/%d/task/%d/status", process->id, found->id);
+  read = ReadHostFile(path, status, sizeof(status));
+  if (read == KIF_STATUS_NOT_FOUND && process->id == found->id) {
+    snprintf(path, sizeof(path), "/proc/%d/status", process->id);
+    read = ReadHostFile(path, status, sizeof(status));
+  }
+  if (read != KIF_STATUS_OK) return read;
+  static constexpr char kKey[] = "\nCpus_allowed_list:\t";
+  const char *list = strstr(status, kKey);
+  if (list == nullptr) return KIF_STATUS_NOT_FOUND;
+  list += sizeof(kKey) - 1;
+  CopyText(text, size, list, strcspn(list, "\n"));
+  return KIF_STATUS_OK;
+}
+
+// The threads of a machine mostly may run on the same CPUs, so the last list is kept.
+KIF_Status ReadAllowedCpus(int64_t id, char *text, size_t size) {
+  if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
+  unsigned char mask[8192 / 8] = {};  // NR_CPUS is at most 8192
+  static unsigned char lastMask[sizeof(mask)];
+  static char lastText[sizeof(SchedAffinity::cpuText)];
+  // The system call itself tells how much of the mask the kernel has; libc's wrapper does not.
+  const long given = syscall(SYS_sched_getaffinity, static_cast<pid_t>(id), sizeof(mask), mask);
+  if (given < 0) return StatusOfErrno(errno);
+  if (lastText[0] == '\0' || memcmp(mask, lastMask, sizeof(mask)) != 0) {
+    memcpy(lastMask, mask, sizeof(mask));
+    FormatCpus(mask, static_cast<size_t>(given), lastText, sizeof(lastText));
+  }
+  snprintf(text, size, "%s", lastText);
+  return KIF_STATUS_OK;
+}
+
 }  // namespace
 
 // See proc(5), /proc/uptime: seconds with two decimals.
@@ -87,4 +159,12 @@ KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, v
     while (*place == ' ') ++place;
   }
   return KIF_STATUS_OK;
+}
+
+// As a list, "0-3,8".
+KIF_Status GetAffinity(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  auto *affinity = static_cast<SchedAffinity *>(record);
+  const int64_t id = instance->params[0].integer;
+  return IsForeignRoot() ? ReadRecordedCpus(id, affinity->cpuText, sizeof(affinity->cpuText))
+                         : ReadAllowedCpus(id, affinity->cpuText, sizeof(affinity->cpuText));
 }

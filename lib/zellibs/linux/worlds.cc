@@ -137,11 +137,6 @@ KIF_Status GetSummaryStats(const NodeInfo &, const KIF_ParamList *instance, void
   return KIF_STATUS_OK;
 }
 
-KIF_Status GetAffinity(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
-  return ReadAllowedCpus(FirstInteger(instance), static_cast<char *>(record),
-                         node.offers.recordSize);
-}
-
 KIF_Status GetStateTimes(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const Thread *thread;
   const Process *process;
