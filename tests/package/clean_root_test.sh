@@ -44,7 +44,7 @@ contents() {
 }
 
 "${as_root[@]}" chmod 755 "$root"
-"${as_root[@]}" cp "$package" "$here/host.txt" "$here/in_clean_root.sh" "$root/"
+"${as_root[@]}" cp "$package" tests/hosts/arm64.txt "$here/in_clean_root.sh" "$root/"
 # The mirror is asked once more for the package's dependencies.
 inside apt-get update -qq
 contents >build/clean-root.before

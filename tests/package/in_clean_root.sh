@@ -9,7 +9,7 @@ fail() { echo "in the clean root: $*" >&2; exit 1; }
 # shellcheck disable=SC2016  # dpkg-query expands it
 version=$(dpkg-query -W -f '${Version}' zlkkiftools)
 [ "$(kifcache --version)" = "kifcache ${version%-*}" ] || fail 'kifcache has another version'
-kifcache build /host.txt host.kif
+kifcache build /arm64.txt host.kif
 kifcache check host.kif >/dev/null
 
 # expect WORDS COMMAND... : the command succeeds and prints the words.
@@ -20,21 +20,11 @@ expect() {
   [[ $printed == *"$words"* ]] || fail "$* printed: $printed"
 }
 recorded() { expect "$1" zlkkiftools -c host.kif "${@:2}"; }
-recorded 'Network controller: Intel Corporation 82540EM' lspci
-recorded '1  1  init' ps
-recorded '12:30:00   02/01/2026   UTC' hwclock
-recorded 'Host 1.0 build-00042' zelvar -v
-recorded '<ZLK device>' irqinfo
-recorded 'Options : quiet' bootOption -o
-recorded 'Writing file DSDT.aml' amldump
-recorded ' 11' pci-info -b 0 -s 2 -f 0 -i
-recorded '1 ' pidof init
-recorded '1 ' userspaceof 1
-recorded '/dev/null' lsof
-recorded boot.tgz mdf
-recorded '/sbin/init' pgrep -l init
-recorded 'up 1 days, 01:01:01, load average: 0.50, 0.25, 0.05' uptime
-ZELLIBS_HOST=$PWD/host.kif expect 'deleted:           10' zlkkiftools mdu -u
+recorded 'Mass storage controller: Red Hat, Inc. Virtio block device [vda]' lspci
+recorded '1     1   init' ps
+recorded 'Options : console=' bootOption -o
+recorded 'load average: ' uptime
+ZELLIBS_HOST=$PWD/host.kif expect '/mnt/ram/gone:            5' zlkkiftools mdu -u
 
 # Live, by the tools' own names.
 PATH=/usr/lib/zlkkiftools/bin:$PATH
