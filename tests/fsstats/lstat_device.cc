@@ -1,6 +1,8 @@
 // A preloaded library that makes a tree of files look like the in-memory root file system to mdu:
-// lstat says that every file is on device 1, but for those whose name begins with "mounted".
+// lstat says that every file is on device 1, but for those whose name begins with "mounted", and
+// has the number that its name ends with; one without a number has the number 0.
 #include <fcntl.h>
+#include <stdlib.h>
 #include <string.h>
 #include <sys/stat.h>
 
@@ -9,7 +11,8 @@ extern "C" __attribute__((visibility("default"))) int lstat(const char *path,
   const int result = fstatat(AT_FDCWD, path, status, AT_SYMLINK_NOFOLLOW);
   if (result != 0) return result;
   const char *slash = strrchr(path, '/');
-  const char *name = slash != nullptr ? slash + 1 : path;
+  const char *name = slash != nullptr && slash[1] != '\0' ? slash + 1 : path;
   status->st_dev = strncmp(name, "mounted", 7) == 0 ? 2 : 1;
+  status->st_ino = strtoul(name + strcspn(name, "0123456789"), nullptr, 10);
   return result;
 }

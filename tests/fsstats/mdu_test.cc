@@ -1,345 +1,184 @@
-#include <dirent.h>
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <filesystem>
-#include <string>
-#include <vector>
-
-#include "fault/fault.h"
 #include "host_fixture.h"
 
 namespace {
 
-constexpr char kUsage[] =
-    "Gather stats about morelfs\nmorelfsdu [filepath]\n"
-    "   -h       multiple instead of bytes\n"
-    "   -d depth reports for each element up to that depth (default 1)\n"
-    "   -a       equivalent to unlimited depth\n   -s       equivalent to zero depth\n"
-    "   -u       display stats for unlinked files\n";
-
-constexpr char kVolumes[] =
-    "list system_morelfs_tardisks = \"boot\"\nlist system_morelfs_ramdisks = \"tmp\"\n";
-
-// A line for a bucket. `size` is as printed; `inodes` is 0 for a file.
-std::string Bucket(const std::string &volume, const std::string &size, int inodes = 0) {
-  std::string line = std::string(volume.size() < 38 ? 38 - volume.size() : 0, ' ') + volume + ": ";
-  line += std::string(size.size() < 12 ? 12 - size.size() : 0, ' ') + size;
-  if (inodes > 0) {
-    const std::string count = std::to_string(inodes);
-    line += "\t\t(" + std::string(5 - count.size(), ' ') + count + " inodes)";
-  }
-  return line + "\n";
-}
+// A file's record is the one whose number its name ends with; lstat_device.cc sees to that.
+constexpr char kHost[] = R"(list system_morelfs_tardisks = "boot"
+list system_morelfs_ramdisks = "tmp"
+record system_morelfs_inodes_stats 0 = size=10 tardisk="no" ramdisk="tmp"
+record system_morelfs_inodes_stats 1 = flags=1 size=100 tardisk="boot" ramdisk="no"
+record system_morelfs_inodes_stats 2 = flags=0x81 size=1048576 tardisk="boot"
+record system_morelfs_inodes_stats 3 = flags=2 size=30 ramdisk="tmp"
+record system_morelfs_inodes_stats 4 = flags=0x40 size=5000 ramdisk="tmp"
+record system_morelfs_inodes_stats 5 = ramdisk="tmp"
+record system_morelfs_inodes_stats 6 = status 0xbad000f
+record system_morelfs_inodes_stats 7 = size=4294967295 ramdisk="tmp"
+record system_morelfs_inodes_stats 8 = size=7 ramdisk="another"
+record system_morelfs_inodes_stats 9 = size=8 ramdisk="a-name-of-more-than-31-characters-1"
+record system_morelfs_inodes_stats 10 = size=9 ramdisk="a-name-of-more-than-31-characters-2"
+)";
 
 class MduTest : public HostTest {
  protected:
-  MduTest() : tree_(Scratch() + "/tree") { mkdir(tree_.c_str(), 0700); }
-
-  // Adds the inode record of a file of the tree to the host.
-  void Describe(const std::string &path, const std::string &fields) {
-    struct stat status = {};
-    EXPECT_EQ(lstat((tree_ + "/" + path).c_str(), &status), 0) << path;
-    host_ += "record system_morelfs_inodes_stats " + std::to_string(status.st_ino) + " = " +
-             fields + "\n";
-  }
-  void AddFile(const std::string &path, const std::string &fields) {
-    WriteFile("tree/" + path, "");
-    Describe(path, fields);
-  }
-  void AddDirectory(const std::string &path, const std::string &fields) {
-    std::filesystem::create_directories(tree_ + "/" + path);
-    Describe(path, fields);
-  }
-
-  Outcome Walk(const std::vector<std::string> &arguments, const std::string &volumes = kVolumes,
-               Surroundings surroundings = {}) {
-    surroundings.directory = tree_;
-    if (surroundings.environment.empty()) {
-      surroundings.environment = {"ASAN_OPTIONS=verify_asan_link_order=0"};
-      surroundings.environment.push_back("LD_PRELOAD=" LSTAT_DEVICE);
-    } else {
-      surroundings.environment.push_back("LD_PRELOAD=" LSTAT_DEVICE ":" FAULT_INJECT);
+  // What each command says in the tree that the shell's command `made` makes.
+  std::string Session(const std::string &host, const std::string &made,
+                      const std::vector<std::string> &commands) {
+    EXPECT_EQ(Run({"sh", "-c", "mkdir tree && cd tree && " + made}).status, 0);
+    const std::string start = "exec 2>&1; cd tree; ulimit -n 24; LD_PRELOAD=" LSTAT_DEVICE
+                              " ASAN_OPTIONS=verify_asan_link_order=0 " BIN_DIR "/zlkkiftools ";
+    std::string session;
+    for (const std::string &command : commands) {
+      const Outcome outcome =
+          Run({"sh", "-c", start + command}, {.environment = {"ZELLIBS_HOST=" + Record(host)}});
+      session += "$ " + command + "\n" + outcome.out;
+      if (outcome.status != 0) session += "[" + std::to_string(outcome.status) + "]\n";
     }
-    std::vector<std::string> all = {"mdu"};
-    all.insert(all.end(), arguments.begin(), arguments.end());
-    return Live(volumes + host_, all, surroundings);
+    Run({"rm", "-rf", "tree"});
+    return session;
   }
-
-  // The blocks of an output in an order of their own: a directory's entries come in any.
-  static std::string Sorted(const std::string &out) {
-    std::vector<std::string> blocks;
-    for (size_t at = 0; at < out.size();) {
-      const size_t end = out.find("\nFor '", at);
-      blocks.push_back(out.substr(at, end == std::string::npos ? end : end + 1 - at));
-      at = end == std::string::npos ? out.size() : end + 1;
-    }
-    std::sort(blocks.begin(), blocks.end());
-    std::string sorted;
-    for (const std::string &block : blocks) sorted += block;
-    return sorted;
-  }
-
-  void Expect(const std::vector<std::string> &arguments, const std::string &out) {
-    const std::string what = testing::PrintToString(arguments);
-    const Outcome outcome = Walk(arguments);
-    EXPECT_EQ(Sorted(outcome.out), Sorted(out)) << what;
-    EXPECT_EQ(outcome.err, "") << what;
-    EXPECT_EQ(outcome.status, 0) << what;
-    // What is reported last is what was asked for.
-    EXPECT_EQ(outcome.out.rfind("For '"), outcome.out.size() - out.size() + out.rfind("For '"));
-  }
-
-  // Two volumes: etc is on the archive, but one of its files was changed and went to memory.
-  void MakeTree() {
-    const std::string boot = " tardisk=\"boot\" ramdisk=\"no\"";
-    const std::string tmp = " tardisk=\"no\" ramdisk=\"tmp\"";
-    Describe("", "flags=0 size=10" + tmp);
-    AddDirectory("etc", "flags=1 size=100" + boot);
-    AddFile("etc/kept", "flags=0x81 size=1500" + boot);
-    AddFile("etc/changed", "flags=2 size=30" + tmp);
-    AddDirectory("etc/sub", "flags=1 size=7" + boot);
-    AddFile("etc/sub/deep", "flags=1 size=1048576" + boot);
-    AddFile("uncharged", "flags=0x40 size=5000" + tmp);
-    AddFile("empty", "flags=0x40 size=0" + tmp);
-    AddDirectory("mounted", "flags=0 size=9999" + tmp);
-    AddFile("mounted/inside", "flags=0 size=9999" + tmp);
-    EXPECT_EQ(symlink("etc", (tree_ + "/link").c_str()), 0);
-    Describe("link", "flags=0 size=3" + tmp);
-  }
-
-  std::string tree_;
-  std::string host_;
 };
 
 TEST_F(MduTest, AddsUpATree) {
-  MakeTree();
-  const std::string etc =
-      "For './etc':\n" + Bucket("tardisk boot", "1050183", 4) + Bucket("ramdisk tmp", "30", 1);
-  const std::string uncharged = "For './uncharged':\n" + Bucket("ramdisk tmp", "0");
-  const std::string link = "For './link':\n" + Bucket("ramdisk tmp", "3");
-  const std::string whole =
-      "For '.':\n" + Bucket("ramdisk tmp", "43", 4) + Bucket("tardisk boot", "1050183", 4);
-  const std::string below = "For './etc/kept':\n" + Bucket("tardisk boot", "1500") +
-                            "For './etc/changed':\n" + Bucket("ramdisk tmp", "30") +
-                            "For './etc/sub':\n" + Bucket("tardisk boot", "1048583", 2);
-  const std::string deep = "For './etc/sub/deep':\n" + Bucket("tardisk boot", "1048576");
-  Expect({}, etc + uncharged + link + whole);
-  Expect({"-a", "-s", "."}, whole);
-  Expect({"-s", "-d", "2"}, below + etc + uncharged + link + whole);
-  Expect({"-d", "junk"}, whole);
-  Expect({"-d", "-1"}, deep + below + etc + uncharged + link + whole);
-  Expect({"-a"}, deep + below + etc + uncharged + link + whole);
-  Expect({"-i"}, etc + uncharged + link + "For './empty':\n" + Bucket("ramdisk tmp", "0") +
-                     "For '.':\n" + Bucket("ramdisk tmp", "43", 5) +
-                     Bucket("tardisk boot", "1050183", 4));
+  EXPECT_EQ(Session(kHost,
+                    "mkdir -p etc1/sub1/mounted etc1/sub1/closed6 && cd etc1/sub1 && "
+                    "touch file2 changed3 uncharged4 empty5 mounted/inside3 closed6/file3 && "
+                    "ln -s file2 link3",
+                    {"mdu -s", "mdu -d 2 etc1/sub1/file2", "mdu -sh etc1", "mdu etc1/sub1/link3",
+                     "mdu nowhere", "mdu etc1/sub1/mounted", "mdu etc1/sub1/empty5",
+                     "mdu -i etc1/sub1/empty5"}),
+            R"($ mdu -s
+KIF_Get error for './etc1/sub1/closed6' (No permission)
+For '.':
+                           ramdisk tmp:           70		(    4 inodes)
+                          tardisk boot:      1048776		(    3 inodes)
+$ mdu -d 2 etc1/sub1/file2
+For 'etc1/sub1/file2':
+                          tardisk boot:      1048576
+$ mdu -sh etc1
+KIF_Get error for 'etc1/sub1/closed6' (No permission)
+For 'etc1':
+                          tardisk boot:    1M		(    3 inodes)
+                           ramdisk tmp:   60B		(    3 inodes)
+$ mdu etc1/sub1/link3
+For 'etc1/sub1/link3':
+                           ramdisk tmp:           30
+$ mdu nowhere
+$ mdu etc1/sub1/mounted
+$ mdu etc1/sub1/empty5
+$ mdu -i etc1/sub1/empty5
+For 'etc1/sub1/empty5':
+                           ramdisk tmp:            0
+)");
 }
 
-TEST_F(MduTest, TakesPathsAsTyped) {
-  MakeTree();
-  Expect({"link"}, "For 'link':\n" + Bucket("ramdisk tmp", "3"));
-  Expect({"etc/sub/"}, "For 'etc/sub/deep':\n" + Bucket("tardisk boot", "1048576") +
-                           "For 'etc/sub/':\n" + Bucket("tardisk boot", "1048583", 2));
-  Expect({"-sh", "etc"},
-         "For 'etc':\n                          tardisk boot:    1M\t\t(    4 inodes)"
-         "\n                           ramdisk tmp:   30B\t\t(    1 inodes)\n");
-  Expect({"-h", "etc/kept"}, "For 'etc/kept':\n                          tardisk boot:    1K\n");
-  for (const char *path : {"mounted", "nowhere", "empty", ""}) {
-    const Outcome outcome = Walk({path});
-    EXPECT_EQ(outcome.out + outcome.err, "") << path;
-    EXPECT_EQ(outcome.status, 0) << path;
-  }
-  // Without the preloaded library no file of the test is on the device.
-  EXPECT_EQ(Live(kVolumes + host_, {"mdu", tree_}).out, "");
+TEST_F(MduTest, GoesAsDeepAsAsked) {
+  EXPECT_EQ(Session(kHost, "mkdir -p a3/b3/c3/d3",
+                    {"mdu a3/b3/", "mdu -sa a3/b3", "mdu -as a3", "mdu -d 2 a3"}),
+            R"($ mdu a3/b3/
+For 'a3/b3/c3':
+                           ramdisk tmp:           60		(    2 inodes)
+For 'a3/b3/':
+                           ramdisk tmp:           90		(    3 inodes)
+$ mdu -sa a3/b3
+For 'a3/b3/c3/d3':
+                           ramdisk tmp:           30		(    1 inodes)
+For 'a3/b3/c3':
+                           ramdisk tmp:           60		(    2 inodes)
+For 'a3/b3':
+                           ramdisk tmp:           90		(    3 inodes)
+$ mdu -as a3
+For 'a3':
+                           ramdisk tmp:          120		(    4 inodes)
+$ mdu -d 2 a3
+For 'a3/b3/c3':
+                           ramdisk tmp:           60		(    2 inodes)
+For 'a3/b3':
+                           ramdisk tmp:           90		(    3 inodes)
+For 'a3':
+                           ramdisk tmp:          120		(    4 inodes)
+)");
 }
 
-TEST_F(MduTest, DropsWhatFitsNoBucket) {
-  Describe("", "flags=0 size=1 ramdisk=\"a\"");
-  AddFile("x", "flags=1 size=2 tardisk=\"a\"");
-  Outcome outcome = Walk({"-s"}, "list system_morelfs_ramdisks = \"a\"\n");
-  EXPECT_EQ(outcome.out, "For '.':\n" + Bucket("ramdisk a", "1", 1));
-  EXPECT_EQ(outcome.err, "Not enough dustats buckets\n");
-  EXPECT_EQ(outcome.status, 0);
-  outcome = Walk({"-s"}, "");
-  EXPECT_EQ(outcome.out, "");
-  EXPECT_EQ(outcome.err, "No bucket space for '.'\n");
-  EXPECT_EQ(outcome.status, 0);
+TEST_F(MduTest, WrapsItsSumsAndDropsWhatFitsNoBucket) {
+  EXPECT_EQ(
+      Session(kHost, "mkdir -p many0 few1/few8 long9 && touch many0/x7 few1/few8/b3 long9/x10",
+              {"mdu -s many0", "mdu -s few1", "mdu -s long9", "mdu -h many0/x7"}),
+      R"($ mdu -s many0
+For 'many0':
+                           ramdisk tmp:            9		(    2 inodes)
+$ mdu -s few1
+Not enough dustats buckets
+For 'few1':
+                          tardisk boot:          100		(    1 inodes)
+                       ramdisk another:            7		(    1 inodes)
+$ mdu -s long9
+For 'long9':
+ramdisk a-name-of-more-than-31-characte:           17		(    2 inodes)
+$ mdu -h many0/x7
+For 'many0/x7':
+                           ramdisk tmp: 4095M
+)");
+  EXPECT_EQ(Session("record system_morelfs_inodes_stats 0 =\n", ":", {"mdu"}), R"($ mdu
+No bucket space for '.'
+)");
 }
 
-TEST_F(MduTest, ComparesTheFirst31CharactersOfAName) {
-  const std::string name(31, 'n');
-  Describe("", "flags=0 size=1 ramdisk=\"" + name + "\"");
-  AddFile("x", "flags=0 size=2 ramdisk=\"" + name + std::string(97, 'x') + "\"");
-  Expect({"-s"}, "For '.':\n" + Bucket("ramdisk " + name, "3", 2));
-}
-
-TEST_F(MduTest, WrapsItsSums) {
-  Describe("", "flags=0 size=0 ramdisk=\"tmp\"");
-  AddFile("x", "flags=0 size=4294967295 ramdisk=\"tmp\"");
-  Expect({}, "For './x':\n" + Bucket("ramdisk tmp", "-1") + "For '.':\n" +
-                 Bucket("ramdisk tmp", "-1", 2));
-  AddFile("y", "flags=0 size=1073741825 ramdisk=\"tmp\"");
-  Expect({"-s"}, "For '.':\n" + Bucket("ramdisk tmp", "1073741824", 3));
-  EXPECT_EQ(Walk({"-sh"}).out,
-            "For '.':\n                           ramdisk tmp: 1024M\t\t(    3 inodes)\n");
-}
-
-TEST_F(MduTest, GoesOnPastWhatCannotBeRead) {
-  MakeTree();
-  AddFile("lost", "status 0xbad0003");
-  AddDirectory("closed", "status 0xbad000f");
-  AddFile("closed/file", "flags=0 size=5 ramdisk=\"tmp\"");
-  const Outcome outcome = Walk({"-s"});
-  EXPECT_EQ(outcome.out,
-            "For '.':\n" + Bucket("ramdisk tmp", "43", 4) + Bucket("tardisk boot", "1050183", 4));
-  const std::string lost = "KIF_Get error for './lost' (Not found)\n";
-  const std::string closed = "KIF_Get error for './closed' (No permission)\n";
-  EXPECT_TRUE(outcome.err == lost + closed || outcome.err == closed + lost) << outcome.err;
-  EXPECT_EQ(outcome.status, 0);
-}
-
-// A tree down to the longest path, made from inside of it.
-class DeepTree {
- public:
-  DeepTree(const std::string &top, int levels) {
-    int directory = open(top.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    for (int i = 0; i < levels && directory >= 0; ++i) {
-      mkdirat(directory, "d", 0700);
-      const int below = openat(directory, "d", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-      close(directory);
-      directory = below;
-      struct stat status = {};
-      EXPECT_EQ(fstat(directory, &status), 0);
-      records += "record system_morelfs_inodes_stats " + std::to_string(status.st_ino) +
-                 " = flags=0 size=2 ramdisk=\"tmp\"\n";
-    }
-    close(directory);
-  }
-
-  std::string records;
-};
-
+// A tree deeper than paths are long, with fewer descriptors than levels. The last directory's path
+// has 4093 characters: none of its entries fits.
 TEST_F(MduTest, WalksToTheLongestPath) {
-  constexpr int kLevels = 2047, kBeyond = 3;
-  const DeepTree deep(tree_, kLevels + kBeyond);
-  Surroundings surroundings;
-  surroundings.directory = tree_;
-  surroundings.environment = {"ZELLIBS_HOST=" + Record(kVolumes + deep.records)};
-  const Outcome outcome =
-      Run({"/bin/sh", "-c",
-           "ulimit -n 24; LD_PRELOAD=" LSTAT_DEVICE
-           " ASAN_OPTIONS=verify_asan_link_order=0 exec " BIN_DIR "/zlkkiftools mdu -s d"},
-          surroundings);
-  Run({"rm", "-rf", tree_});
-  EXPECT_EQ(outcome.out, "For 'd':\n" + Bucket("ramdisk tmp", "4094", kLevels));
-  EXPECT_EQ(outcome.status, 0);
-  // The last directory's path has 4093 characters: none of its entries fits.
-  std::string last = "d";
-  for (int i = 1; i < kLevels; ++i) last += "/d";
-  const std::string before = "path too long for '" + last + "' ";
-  for (const char *entry : {"'.' (4095)\n", "'..' (4096)\n", "'d' (4095)\n"}) {
-    EXPECT_NE(outcome.err.find(before + entry), std::string::npos) << entry;
+  std::string path = "d";
+  for (int i = 1; i < 2047; ++i) path += "/d";
+  std::string session =
+      Session(kHost, "mkdir -p " + path + " && cd -P " + path + " && mkdir -p d/d", {"mdu -s d"});
+  for (const std::string entry : {"'.' (4095)", "'..' (4096)", "'d' (4095)"}) {
+    const std::string said = "path too long for '" + path + "' " + entry + "\n";
+    ASSERT_NE(session.find(said), session.npos) << entry;
+    session.erase(session.find(said), said.size());
   }
-  EXPECT_EQ(std::count(outcome.err.begin(), outcome.err.end(), '\n'), 3);
-}
-
-TEST_F(MduTest, EndsAtAPathThatTakesNoSlash) {
-  Describe("", "flags=0 size=2 ramdisk=\"tmp\"");
-  std::string path;
-  while (path.size() < 4094) path += "./";
-  Outcome outcome = Walk({path + "."});
-  EXPECT_EQ(outcome.out, "");
-  EXPECT_EQ(outcome.err, "path too long for '" + path + ".' (4096)\n");
-  EXPECT_EQ(outcome.status, 0);
-  path += "/";
-  outcome = Walk({path});
-  EXPECT_EQ(outcome.out, "For '" + path + "':\n" + Bucket("ramdisk tmp", "2", 1));
-  for (const char *entry : {"'.' (4096)\n", "'..' (4097)\n"}) {
-    EXPECT_NE(outcome.err.find("path too long for '" + path + "' " + entry), std::string::npos);
-  }
-  outcome = Walk({path + "/"});
-  EXPECT_EQ(outcome.out + outcome.err, "");
+  EXPECT_EQ(session, R"($ mdu -s d
+For 'd':
+                           ramdisk tmp:        20470		( 2047 inodes)
+)");
 }
 
 TEST_F(MduTest, ListsUnlinkedFiles) {
-  host_ =
-      "list system_morelfs_inodes = 1 2 3 -4\n"
-      "record system_morelfs_inodes_stats 1 = linkState=-4 size=1500 flags=0x40 name=\"gone\"\n"
-      "record system_morelfs_inodes_stats 2 = linkState=4 size=7 name=\"there\"\n"
-      "record system_morelfs_inodes_stats -4 = linkState=-4 size=4294967295 name=\"100%s\"\n";
-  Outcome outcome = Walk({"-u", "/ignored"});
-  EXPECT_EQ(outcome.out, "Unlinked files:\n" + Bucket("gone", "1500") + Bucket("100%s", "-1") +
-                             "Total unlinked files: 2\nSize of unlinked files:  4294968795\n");
-  EXPECT_EQ(outcome.err, "");
-  EXPECT_EQ(outcome.status, 0);
-  outcome = Walk({"-hu"});
-  EXPECT_EQ(outcome.out,
-            "Unlinked files:\n                                  gone:    1K\n"
-            "                                 100%s: 4095M\n"
-            "Total unlinked files: 2\nSize of unlinked files:  1K\n");
-}
-
-TEST_F(MduTest, SaysHowTheUnlinkedReportEnded) {
-  const std::string good =
-      "record system_morelfs_inodes_stats 1 = linkState=-4 size=1 name=\"a\"\n";
-  const std::string block = "Unlinked files:\n" + Bucket("a", "1") +
-                            "Total unlinked files: 1\nSize of unlinked files:  1\n";
-  const struct {
-    std::string host, out;
-    int status;
-  } cases[] = {
-      {"", "", 1},
-      {"list system_morelfs_inodes =\n", "No unlinked files.\n", 0},
-      {"list system_morelfs_inodes = 2\nrecord system_morelfs_inodes_stats 2 =\n",
-       "No unlinked files.\n", 0},
-      {"list system_morelfs_inodes = 2\n", "No unlinked files.\n", 1},
-      {"list system_morelfs_inodes = 2 1\n" + good, block, 0},
-      {"list system_morelfs_inodes = 1 2\n" + good, block, 1},
-      {"list system_morelfs_inodes = 1 \"text\" 1\n" + good, block, 1},
-  };
-  for (const auto &test : cases) {
-    const Outcome outcome = Live(test.host, {"mdu", "-u"});
-    EXPECT_EQ(outcome.out, test.out) << test.host;
-    EXPECT_EQ(outcome.err, "") << test.host;
-    EXPECT_EQ(outcome.status, test.status) << test.host;
-  }
-}
-
-TEST_F(MduTest, RunsOutOfMemory) {
-  Describe("", "flags=0 size=1 ramdisk=\"tmp\"");
-  AddFile("x", "flags=0 size=2 ramdisk=\"tmp\"");
-  Outcome outcome = Walk({}, kVolumes, Failing("KIF_ParamListCreate", 2));
-  EXPECT_EQ(outcome.out, "For '.':\n" + Bucket("ramdisk tmp", "1", 1));
-  EXPECT_EQ(outcome.err, "KIF_Get error for './x' (Out of memory)\n");
-  outcome = Walk({}, kVolumes, Failing("calloc", 1));
-  EXPECT_EQ(outcome.out + outcome.err, "");
-  EXPECT_EQ(outcome.status, 244);
-  outcome = Walk({}, kVolumes, Failing("calloc", 2));
-  EXPECT_EQ(outcome.out, "For '.':\n" + Bucket("ramdisk tmp", "1", 1));
-  EXPECT_EQ(outcome.err, "unable to allocate memory for stats");
-  EXPECT_EQ(outcome.status, 0);
-}
-
-TEST_F(MduTest, RefusesBadRuns) {
-  Outcome outcome = Cache(kVolumes, {"mdu", "-x"});
-  EXPECT_EQ(outcome.err, "Using KIF cache is unsupported\n");
-  EXPECT_EQ(outcome.status, 1);
-  const struct {
-    std::vector<std::string> arguments;
-    std::string diagnostic;
-  } cases[] = {
-      {{"mdu", "-u", "a", "b"}, ""},
-      {{"mdu", "-x"}, "mdu: invalid option -- 'x'\n"},
-      {{"mdu", "-d"}, "mdu: option requires an argument -- 'd'\n"},
-  };
-  for (const auto &test : cases) {
-    outcome = Live(kVolumes, test.arguments);
-    EXPECT_EQ(outcome.out, "");
-    EXPECT_EQ(outcome.err, test.diagnostic + kUsage);
-    EXPECT_EQ(outcome.status, 1);
-  }
+  constexpr char kUnlinked[] = R"(list system_morelfs_inodes = 1 2 3 -4
+record system_morelfs_inodes_stats 1 = linkState=-4 size=1500 flags=0x40 name="gone"
+record system_morelfs_inodes_stats 2 = linkState=4 size=7 name="there"
+record system_morelfs_inodes_stats -4 = linkState=-4 size=4294967295 name="100%s"
+)";
+  EXPECT_EQ(Session(kUnlinked, ":", {"mdu -u /ignored", "mdu -hu"}), R"($ mdu -u /ignored
+Unlinked files:
+                                  gone:         1500
+                                 100%s:           -1
+Total unlinked files: 2
+Size of unlinked files:  4294968795
+$ mdu -hu
+Unlinked files:
+                                  gone:    1K
+                                 100%s: 4095M
+Total unlinked files: 2
+Size of unlinked files:  1K
+)");
+  EXPECT_EQ(Session("list system_morelfs_inodes = 1 2\nrecord system_morelfs_inodes_stats 1 = "
+                    "linkState=-4 size=1 name=\"a\"\n",
+                    ":", {"mdu -u"}),
+            R"($ mdu -u
+Unlinked files:
+                                     a:            1
+Total unlinked files: 1
+Size of unlinked files:  1
+[1]
+)");
+  EXPECT_EQ(Session("list system_morelfs_inodes = 2\n", ":", {"mdu -u"}), R"($ mdu -u
+No unlinked files.
+[1]
+)");
+  EXPECT_EQ(Session("list system_morelfs_inodes =\n", ":", {"mdu -u"}), R"($ mdu -u
+No unlinked files.
+)");
 }
 
 }  // namespace
