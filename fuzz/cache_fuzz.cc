@@ -8,9 +8,9 @@
 #include "cache_file.h"
 #include "check.h"
 #include "json_writer.h"
-#include "kif/zellibs.h"
 #include "read_host.h"
 #include "text_writer.h"
+#include "zellibs.h"
 
 namespace {
 

@@ -11,8 +11,8 @@
 #include <filesystem>
 #include <string>
 
-#include "kif/zellibs.h"
 #include "read_host.h"
+#include "zellibs.h"
 
 namespace {
 

@@ -3,8 +3,8 @@
 #include <stdlib.h>
 #include <string.h>
 
-#include "kif/zellibs.h"
 #include "nodes.h"
+#include "zellibs.h"
 
 namespace {
 

@@ -9,8 +9,8 @@
 #include <vector>
 
 #include "cache_generated.h"
-#include "kif/zellibs.h"
 #include "nodes.h"
+#include "zellibs.h"
 
 // A parameter: an integer, a text, or a text without a value.
 struct Value {

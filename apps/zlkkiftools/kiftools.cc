@@ -9,9 +9,9 @@
 
 #include <string_view>
 
-#include "kif/zellibs.h"
 #include "output.h"
 #include "tools.h"
+#include "zellibs.h"
 
 uint8_t InvokedWithCache = 0;
 

@@ -7,8 +7,8 @@
 #include <cstdint>
 
 #include "cache_generated.h"
-#include "kif/zellibs.h"
 #include "nodes.h"
+#include "zellibs.h"
 
 constexpr uint16_t kCacheMajorVersion = 1;
 constexpr uint16_t kCacheMinorVersion = 0;

@@ -3,7 +3,7 @@
 
 #include <cstdint>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // A data object, beginning as callers see it; the bytes follow it in the same allocation.
 struct Data {

@@ -4,8 +4,8 @@
 
 #include <cstdint>
 
-#include "kif/zellibs.h"
 #include "nodes.h"
+#include "zellibs.h"
 
 // The methods give a status; what they hand out counts only when it is KIF_STATUS_OK. `node`
 // offers what is asked of it, and `instance` (null: none) holds any parameters at all: a host

@@ -1,19 +1,29 @@
-// The operations on nodes and on the host as a whole.
+// The operations on nodes and on the host as a whole, the node variables and the state tables.
 #include <cstdio>
 #include <cstring>
 
 #include "data.h"
 #include "host.h"
-#include "kif/zellibs.h"
 #include "nodes.h"
 #include "param_list.h"
 #include "records/platform.h"
+#include "states.h"
 #include "status.h"
 #include "trace.h"
+#include "zellibs.h"
 
 #define NODE(path, ...) const KIF_NodeId KIF_NODE_##path = kNode_##path + 1;
 #include "nodes.def"
 #undef NODE
+
+#define STATE(place, name) {{0, 0}, name},
+const CpuSched_StateElement CpuSched_RunStateElements[] = {
+    RUN_STATES(STATE){{0, 0}, nullptr},
+};
+const CpuSched_StateElement CpuSched_WaitStateElements[] = {
+    WAIT_STATES(STATE){{0, 0}, nullptr},
+};
+#undef STATE
 
 namespace {
 

@@ -3,7 +3,7 @@
 
 #include <cstdint>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // A parameter, beginning as callers see it. Strings are the list's own copies.
 struct Param {

@@ -2,8 +2,8 @@
 // data objects that were never destroyed. Costs one test of a flag where it is not asked for.
 #pragma once
 
-#include "kif/zellibs.h"
 #include "nodes.h"
+#include "zellibs.h"
 
 enum class TraceKind { kList, kData };
 

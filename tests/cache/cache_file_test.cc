@@ -5,6 +5,7 @@
 #include "cache_file.h"
 #include "host_fixture.h"
 #include "status.h"
+#include "zellibs.h"
 
 namespace {
 

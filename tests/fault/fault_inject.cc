@@ -20,7 +20,7 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 namespace {
 

@@ -1,5 +1,5 @@
-// The program's use of the platform library: owning handles, the two shared wrappers, the walk
-// over an instance list, and reads of fixed records.
+// The program's use of the platform library: the statuses that it names, owning handles, the two
+// shared wrappers, the walk over an instance list, and reads of fixed records.
 #pragma once
 
 #include <bit>
@@ -9,7 +9,14 @@
 #include <memory>
 #include <type_traits>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
+
+// Statuses that the program names itself.
+#define KIF_STATUS_FAILURE 0xbad0001u
+#define KIF_STATUS_BAD_PARAMETER 0xbad0007u
+#define KIF_STATUS_NO_MEMORY 0xbad0014u
+#define KIF_STATUS_NO_RESOURCES 0xbad0017u
+#define KIF_STATUS_NO_COMMAND_LINE 0xbad0062u
 
 static_assert(std::endian::native == std::endian::little, "records are little-endian");
 

@@ -5,9 +5,9 @@
 
 #include <string_view>
 
-#include "kif/zellibs.h"
 #include "output.h"
 #include "records/worlds.h"
+#include "zellibs.h"
 
 namespace {
 

@@ -9,7 +9,7 @@
 #include <cstdint>
 #include <cstdlib>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // An open file descriptor, closed with its owner. -1: none.
 class Descriptor {

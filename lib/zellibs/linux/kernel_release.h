@@ -3,7 +3,7 @@
 
 #include <cstddef>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // Writes the release ("6.1.0-9-amd64"), printable and terminated, to `release`.
 KIF_Status ReadKernelRelease(char *release, size_t size);

@@ -4,7 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // Copies the last component of the target of a link below the open folder `directory`, printable
 // and terminated, to `name`; empty where there is no such link.

@@ -4,7 +4,7 @@
 
 #include <cstdint>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // Gives the directory of `process`, which stays open until another process is asked for; opens it
 // anew where `fresh` or not yet open. KIF_STATUS_NOT_FOUND where the process has gone.

@@ -6,8 +6,8 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "kif/zellibs.h"
 #include "records/worlds.h"
+#include "zellibs.h"
 
 constexpr size_t kThreadNameSize = 64;  // proc(5): comm is cut to 15 bytes, kernel threads' to 63
 constexpr size_t kCommandLineSize = sizeof(CartelCommandLine::text);

@@ -5,7 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "kif/zellibs.h"
+#include "zellibs.h"
 
 // Makes the sockets of a process's network namespace known, as far as they can be read. `process`
 // is its open directory. Fails only for want of memory or descriptors.

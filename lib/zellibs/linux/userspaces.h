@@ -3,8 +3,8 @@
 
 #include <cstddef>
 
-#include "kif/zellibs.h"
 #include "linux/processes.h"
+#include "zellibs.h"
 
 // Reads the PID namespaces of `count` processes, ascending by ID, below `proc`, an open /proc, and
 // fills their pidNamespace, userspace and treeParent.

@@ -6,29 +6,16 @@
 #include "linux/linux_nodes.h"
 #include "linux/processes.h"
 #include "records/worlds.h"
+#include "states.h"
 
 namespace {
 
-// The run and wait states that a state letter of proc(5) stands for: places in the tables below.
+// The run and wait states that a state letter of proc(5) stands for.
 struct State {
   char letter;
   uint32_t run;
   uint32_t wait;
 };
-
-enum RunState : uint32_t {
-  kRun,
-  kSleep,
-  kDisk,
-  kStop,
-  kTrace,
-  kPark,
-  kIdle,
-  kZombie,
-  kDead,
-  kOther
-};
-enum WaitState : uint32_t { kNone, kInterruptible, kUninterruptible, kSignal, kTracer, kUnpark };
 
 constexpr State kStates[] = {
     {'R', kRun, kNone},
@@ -67,18 +54,6 @@ uint32_t TypeOf(const Thread &thread, const Process &process) {
 }
 
 }  // namespace
-
-extern "C" {
-const CpuSched_StateElement CpuSched_RunStateElements[] = {
-    {{0, 0}, "RUN"},   {{0, 0}, "SLEEP"}, {{0, 0}, "DISK"},  {{0, 0}, "STOP"},
-    {{0, 0}, "TRACE"}, {{0, 0}, "PARK"},  {{0, 0}, "IDLE"},  {{0, 0}, "ZOMBIE"},
-    {{0, 0}, "DEAD"},  {{0, 0}, "OTHER"}, {{0, 0}, nullptr},
-};
-const CpuSched_StateElement CpuSched_WaitStateElements[] = {
-    {{0, 0}, "NONE"},   {{0, 0}, "INTR"},   {{0, 0}, "UNINT"}, {{0, 0}, "SIGNAL"},
-    {{0, 0}, "TRACER"}, {{0, 0}, "UNPARK"}, {{0, 0}, nullptr},
-};
-}
 
 KIF_Status ListWorlds(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
   const Thread *threads;

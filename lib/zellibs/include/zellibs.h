@@ -1,6 +1,5 @@
-// The C face of the platform library, libzellibs.so, as the program uses it. Every symbol carries
-// the version tag NEVRAPLATFORM. Our own library includes this header too, so that the compiler
-// compares the two sides.
+// The C face of the platform library, libzellibs.so. Every symbol carries the version tag
+// NEVRAPLATFORM. The library includes this header too, so that the compiler compares the two sides.
 #pragma once
 
 #include <stdbool.h>
@@ -41,13 +40,6 @@ typedef struct CpuSched_StateElement {
   uint32_t reserved[2];
   const char *name;
 } CpuSched_StateElement;
-
-// Statuses that the program names itself.
-#define KIF_STATUS_FAILURE 0xbad0001u
-#define KIF_STATUS_BAD_PARAMETER 0xbad0007u
-#define KIF_STATUS_NO_MEMORY 0xbad0014u
-#define KIF_STATUS_NO_RESOURCES 0xbad0017u
-#define KIF_STATUS_NO_COMMAND_LINE 0xbad0062u
 
 // Reads the record of `node` for `instance` (null: none) into `size` bytes of `buffer`.
 KIF_Status KIF_Get(uint32_t node, KIF_ParamList *instance, void *buffer, uint32_t size);
