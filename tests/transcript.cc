@@ -1,0 +1,345 @@
+#include "transcript.h"
+
+#include <gmock/gmock.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <fstream>
+#include <iostream>
+#include <regex>
+#include <set>
+#include <sstream>
+
+#include "fault/fault.h"
+#include "host_fixture.h"
+#include "printable/printable.h"
+
+namespace {
+
+using Lines = std::vector<std::string>;
+
+// A part of a file: lines that are kept as they are, or a command and what it is to give.
+struct Part {
+  int line;
+  Lines text;  // of a command: it and its continuations
+  Lines expected = {};
+  bool isCommand = false;
+};
+
+struct Transcript {
+  std::string path;
+  std::vector<Part> parts;
+};
+
+struct Case {
+  Transcript *transcript;
+  std::string name;
+  Lines host;
+  std::vector<size_t> commands;  // indices of parts
+};
+
+Lines Split(const std::string &text) {
+  Lines lines;
+  std::istringstream stream(text);
+  for (std::string line; std::getline(stream, line);) lines.push_back(line);
+  return lines;
+}
+
+std::string Join(const Lines &lines) {
+  std::string text;
+  for (const std::string &line : lines) text += line + "\n";
+  return text;
+}
+
+// The bytes as a transcript has them; see README.md.
+Lines Readable(const std::string &bytes, const std::string &prefix) {
+  Lines lines = Split(bytes);
+  for (std::string &line : lines) {
+    std::string readable = prefix;
+    if (prefix.empty() && std::string("$!#[>=").find(line[0]) != std::string::npos) {
+      readable = line.empty() ? "" : "\\";
+    }
+    for (size_t i = 0; i < line.size();) {
+      const auto *at = reinterpret_cast<const unsigned char *>(line.data()) + i;
+      const size_t length = printable::SequenceLength(at, line.size() - i);
+      char escape[8] = {line[i]};
+      if (*at == '\t') snprintf(escape, sizeof(escape), "\\t");
+      if (*at == '\\') snprintf(escape, sizeof(escape), "\\\\");
+      if ((*at < ' ' && *at != '\t') || *at == 0x7f || (*at >= 0x80 && length == 0)) {
+        snprintf(escape, sizeof(escape), "\\x%02x", *at);
+      }
+      readable += length > 0 ? line.substr(i, length) : escape;
+      i += std::max<size_t>(length, 1);
+    }
+    const bool ends = &line != &lines.back() || bytes.back() == '\n';
+    if (!ends) readable += "\\c";
+    if (ends && (line.empty() || line.back() == ' ')) readable += "\\";
+    line = readable;
+  }
+  return lines;
+}
+
+Lines Readable(const Outcome &outcome) {
+  Lines lines = Readable(outcome.out, "");
+  const Lines messages = Readable(outcome.err, "! ");
+  lines.insert(lines.end(), messages.begin(), messages.end());
+  if (outcome.status != 0) lines.push_back("[" + std::to_string(outcome.status) + "]");
+  return lines;
+}
+
+// A line of a file's content, with its end.
+std::string Content(const std::string &text) {
+  std::string bytes;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '\\' || i + 1 == text.size()) {
+      if (text[i] != '\\') bytes += text[i];
+      continue;
+    }
+    const char kind = text[++i];
+    if (kind == 'c') return bytes;
+    if (kind == 'x') {
+      bytes += static_cast<char>(std::stoi(text.substr(i + 1, 2), nullptr, 16));
+      i += 2;
+    } else {
+      bytes += kind == 't' ? '\t' : kind == 'n' ? '\n' : kind == '0' ? '\0' : kind;
+    }
+  }
+  return bytes + '\n';
+}
+
+// "8680 @0x3c 0b": bytes, and zeros as far as an offset.
+std::string Hexadecimal(const std::string &text) {
+  std::string bytes;
+  std::istringstream stream(text);
+  for (std::string word; stream >> word;) {
+    if (word[0] == '@') {
+      bytes.resize(std::stoul(word.substr(1), nullptr, 0));
+      continue;
+    }
+    for (size_t i = 0; i + 1 < word.size(); i += 2) {
+      bytes += static_cast<char>(std::stoi(word.substr(i, 2), nullptr, 16));
+    }
+  }
+  return bytes;
+}
+
+// The tools that a link in the folder of the programs runs.
+bool IsTool(const std::string &word) {
+  return !word.empty() && word.find('/') == word.npos && word != "kifcache" &&
+         word != "zlkkiftools" && access((BIN_DIR "/" + word).c_str(), X_OK) == 0;
+}
+
+class CaseTest : public HostTest {
+ public:
+  explicit CaseTest(const Case &one) : case_(one) {}
+
+  void TestBody() override {
+    WriteHost();
+    for (const size_t index : case_.commands) Check(&case_.transcript->parts[index]);
+    if (getenv("RENEW") != nullptr) Save();
+  }
+
+ private:
+  void WriteHost();
+  void WriteTree(const Lines &lines);
+  void Check(Part *command);
+  void Compare(Part *command, const Lines &lines, const char *way);
+  Lines RunCommand(const std::string &words, const std::string &program,
+                   const std::string &arguments, const std::string &host);
+  void Save() const;
+
+  const Case &case_;
+  std::string host_ = "none";
+};
+
+void CaseTest::WriteHost() {
+  Lines text, tree, keys;
+  for (const std::string &line : case_.host) {
+    if (line[0] == '/' || line[0] == ' ') {
+      tree.push_back(line);
+      continue;
+    }
+    // A later answer for the same place takes the place of the one before.
+    const std::string key = line.substr(0, line.find(" ="));
+    const auto before = std::find(keys.begin(), keys.end(), key);
+    if (before != keys.end()) {
+      text[static_cast<size_t>(before - keys.begin())] = line;
+      continue;
+    }
+    keys.push_back(key);
+    text.push_back(line);
+  }
+  if (!tree.empty()) WriteTree(tree);
+  if (text.empty()) return;
+  std::filesystem::rename(Record(Join(text)), Scratch() + "/host.kif");
+  host_ = Scratch() + "/host.kif";
+}
+
+void CaseTest::WriteTree(const Lines &lines) {
+  host_ = "linux:" + Scratch() + "/tree";
+  std::string file;
+  for (const std::string &line : lines) {
+    if (line[0] == ' ') {
+      std::ofstream(file, std::ios::binary | std::ios::app) << Content(line.substr(2));
+      continue;
+    }
+    const size_t arrow = line.find(" -> "), sign = line.find(" =");
+    const std::string path = "tree" + line.substr(0, std::min(arrow, sign));
+    const std::string value = sign + 3 < line.size() ? line.substr(sign + 3) : "";
+    if (path.back() == '/') {
+      std::filesystem::create_directories(Scratch() + "/" + path);
+    } else if (arrow != line.npos) {
+      const std::filesystem::path link = Scratch() + "/" + path;
+      std::filesystem::create_directories(link.parent_path());
+      std::filesystem::create_symlink(line.substr(arrow + 4), link);
+    } else if (value.starts_with("hex ")) {
+      file = WriteFile(path, Hexadecimal(value.substr(4)));
+    } else {
+      file = WriteFile(path, value.empty() ? "" : Content(value));
+    }
+  }
+}
+
+Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
+                           const std::string &arguments, const std::string &host) {
+  // FAIL=operation:n[:status] becomes the words that the preloaded library knows.
+  std::string line = words;
+  std::smatch fail;
+  if (std::regex_search(line, fail, std::regex("FAIL=(\\w+):(\\d+)(\\+?)(:(\\w+))? "))) {
+    std::string variables = fail[3].length() > 0 ? "FAIL_FROM=1 " : "";
+    const std::string status = fail[5].length() > 0 ? fail[5].str() : "0xbad0001";
+    for (const std::string &word : Failing(fail[1], std::stoi(fail[2]), status).environment) {
+      variables += word + " ";
+    }
+    line = fail.prefix().str() + variables + fail.suffix().str();
+  }
+  line = "PATH=" BIN_DIR ":$PATH\n" + line + program + arguments;
+  std::vector<std::string> run = {"sh", "-c", line};
+  if (line.find("pkill") != line.npos) {
+    // Whatever pkill does, it reaches no process but those of this command.
+    run = {"unshare", "--pid", "--fork", "--mount-proc", "--kill-child", "bash", "-c", line};
+    if (geteuid() != 0) run.insert(run.begin() + 1, {"--user", "--map-root-user"});
+  }
+  std::error_code none;
+  if (IsTool(program.substr(program.rfind(' ') + 1))) {
+    std::filesystem::remove(Scratch() + "/trace", none);
+  }
+  const Outcome outcome =
+      Run(run, {.environment = {"ZELLIBS_HOST=" + host, "ZELLIBS_TRACE=" + Scratch() + "/trace",
+                                "SOURCE=" SOURCE_DIR}});
+  Lines lines = Readable(outcome);
+  if (ReadFile(Scratch() + "/trace").find("never destroyed") != std::string::npos) {
+    lines.push_back("[an object was never destroyed]");
+  }
+  return lines;
+}
+
+void CaseTest::Check(Part *command) {
+  std::string line = command->text[0].substr(2);
+  for (size_t i = 1; i < command->text.size(); ++i) line += "\n" + command->text[i].substr(2);
+  static const std::regex kWords("(live |cached )?((?:\\w+=\\S* )*)([^\\s;|&<>]+)([^]*)");
+  std::smatch parts;
+  if (!std::regex_match(line, parts, kWords)) {
+    ADD_FAILURE_AT(case_.transcript->path.c_str(), command->line) << "no command";
+    return;
+  }
+  const std::string way = parts[1], words = parts[2], program = parts[3], arguments = parts[4];
+  const bool cache = host_.ends_with(".kif") && IsTool(program) && way != "live " &&
+                     words.find("ZELLIBS_HOST=") == words.npos;
+  if (way != "cached ") Compare(command, RunCommand(words, program, arguments, host_), "live");
+  if (!cache) return;
+  const std::string file = "zlkkiftools -c host.kif " + program;
+  Compare(command, RunCommand(words, file, arguments, "none"), "cached");
+}
+
+void CaseTest::Compare(Part *command, const Lines &lines, const char *way) {
+  if (lines == command->expected) return;
+  const std::string expected = WriteFile("expected", Join(command->expected));
+  const std::string actual = WriteFile("actual", Join(lines));
+  const std::string what =
+      command->text[0] + "  (" + way + ")\n" +
+      Run({"diff", "-U2", "--label", "expected", "--label", "actual", expected, actual}).out;
+  if (getenv("RENEW") == nullptr) {
+    GTEST_MESSAGE_AT_(case_.transcript->path.c_str(), command->line, what.c_str(),
+                      testing::TestPartResult::kNonFatalFailure);
+    return;
+  }
+  std::cout << case_.transcript->path << ":" << command->line << ": " << what;
+  command->expected = lines;
+}
+
+void CaseTest::Save() const {
+  std::string text;
+  for (const Part &part : case_.transcript->parts) text += Join(part.text) + Join(part.expected);
+  if (ReadFile(case_.transcript->path) == text) return;
+  std::ofstream(case_.transcript->path, std::ios::binary) << text;
+}
+
+// What stands before the first title belongs to every case.
+std::vector<Case> ReadTranscript(Transcript *transcript) {
+  std::vector<Case> cases(1);
+  cases[0].transcript = transcript;
+  std::ifstream stream(transcript->path);
+  bool inOutput = false;
+  int number = 0;
+  for (std::string line; std::getline(stream, line);) {
+    ++number;
+    std::vector<Part> &parts = transcript->parts;
+    if (line.starts_with("=== ")) {
+      cases.push_back({transcript, line.substr(4), cases[0].host, {}});
+      inOutput = false;
+    } else if (line.starts_with("$ ")) {
+      cases.back().commands.push_back(parts.size());
+      parts.push_back({number, {line}, {}, true});
+      inOutput = true;
+      continue;
+    } else if (inOutput && line.starts_with("> ") && parts.back().expected.empty()) {
+      parts.back().text.push_back(line);
+      continue;
+    } else if (!line.empty() && line[0] != '#') {
+      if (inOutput) {
+        parts[cases.back().commands.back()].expected.push_back(line);
+        continue;
+      }
+      cases.back().host.push_back(line);
+    }
+    parts.push_back({number, {line}});
+  }
+  return cases;
+}
+
+void RegisterTranscript(const std::filesystem::path &path, const std::string &suite) {
+  static std::set<std::string> names;
+  const auto word = [](std::string text) {
+    for (char &c : text) c = isalnum(static_cast<unsigned char>(c)) ? c : '_';
+    return text;
+  };
+  auto *transcript = new Transcript{path, {}};
+  for (const Case &found : ReadTranscript(transcript)) {
+    if (found.commands.empty()) continue;
+    const auto *one = new Case(found);
+    std::string name = word(path.stem());
+    if (!found.name.empty()) name += "/" + word(found.name);
+    while (!names.insert(name).second) name += "_";
+    testing::RegisterTest(suite.c_str(), name.c_str(), nullptr, nullptr, path.c_str(),
+                          transcript->parts[found.commands[0]].line,
+                          [one]() -> testing::Test * { return new CaseTest(*one); });
+  }
+}
+
+}  // namespace
+
+void RegisterTranscripts(const std::string &folder) {
+  std::vector<std::filesystem::path> files;
+  for (const auto &entry : std::filesystem::directory_iterator(folder)) {
+    if (entry.path().extension() == ".transcript") files.push_back(entry.path());
+  }
+  std::sort(files.begin(), files.end());
+  const std::string suite = std::filesystem::path(folder).filename().string();
+  for (const auto &file : files) {
+    std::string name = suite;
+    std::replace(name.begin(), name.end(), '-', '_');
+    RegisterTranscript(file, name);
+  }
+}
