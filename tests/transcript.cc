@@ -227,7 +227,8 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
   }
   const Outcome outcome =
       Run(run, {.environment = {"ZELLIBS_HOST=" + host, "ZELLIBS_TRACE=" + Scratch() + "/trace",
-                                "SOURCE=" SOURCE_DIR}});
+                                "SOURCE=" SOURCE_DIR, "LSTAT_DEVICE=" LSTAT_DEVICE,
+                                "ASAN_OPTIONS=detect_leaks=1:verify_asan_link_order=0"}});
   Lines lines = Readable(outcome);
   if (ReadFile(Scratch() + "/trace").find("never destroyed") != std::string::npos) {
     lines.push_back("[an object was never destroyed]");
