@@ -7,14 +7,15 @@
 
 #include <cstring>
 #include <string>
-#include <string_view>
 
 #include "cache_file.h"
 #include "cache_writer.h"
 #include "check.h"
+#include "command_line.h"
 #include "host_model.h"
 #include "json_writer.h"
 #include "memory.h"
+#include "messages.h"
 #include "node_table.h"
 #include "recorder.h"
 #include "status.h"
@@ -23,21 +24,11 @@
 
 namespace {
 
-constexpr char kUsage[] =
-    "usage: kifcache COMMAND\n"
-    "  record [--redact] FILE  save this host into FILE; with --redact without the arguments\n"
-    "                          of command lines and the values of boot options\n"
-    "  check FILE              verify FILE and tell what is in it\n"
-    "  dump [--json] FILE      print what FILE holds as text, or as JSON Lines\n"
-    "  build TEXT FILE         make FILE from the text that dump prints; - is standard input\n"
-    "  nodes                   list the nodes and the named fields of their records\n"
-    "  --help, --version\n";
-
 class OpenFile {
  public:
   explicit OpenFile(const char *path) : status_(OpenCacheFile(path, &file_)) {
     if (status_ != 0) {
-      fprintf(stderr, "kifcache: %s: %s\n", path, ZLK_ReturnStatusToString(status_));
+      Complain(path, ZLK_ReturnStatusToString(status_));
     }
   }
   ~OpenFile() { CloseCacheFile(&file_); }
@@ -65,80 +56,78 @@ bool ReadFile(const char *path, std::string *bytes) {
     if (count > 0) bytes->append(block, static_cast<size_t>(count));
   }
   if (!isInput && descriptor != -1) close(descriptor);
-  if (count < 0) fprintf(stderr, "kifcache: %s: %s\n", path, strerror(error));
+  if (count < 0) Complain(path, strerror(error));
   return count == 0;
 }
 
-bool Record(const char *path, bool redact) {
+constexpr Option kRedact = {
+    "redact", nullptr, "without the arguments of command lines and the values of boot options"};
+constexpr Option kJson = {"json", nullptr, "as JSON Lines"};
+
+int Record(const Arguments &given) {
   HostModel model;
-  const RecordOptions options = {redact, isatty(STDERR_FILENO) == 1};
-  return RecordHost(options, &model) && WriteCacheFile(model, path);
+  const RecordOptions options = {given.Has(kRedact), isatty(STDERR_FILENO) == 1};
+  return RecordHost(options, &model) && WriteCacheFile(model, given.operands[0]) ? 0 : 1;
 }
 
-bool Check(const char *path) {
-  const OpenFile open(path);
-  return open.isOpen() && CheckFile(path, open.file(), stdout);
+int Check(const Arguments &given) {
+  const OpenFile open(given.operands[0]);
+  return open.isOpen() && CheckFile(given.operands[0], open.file(), stdout) ? 0 : 1;
 }
 
-bool Dump(const char *path, bool asJson) {
+int Dump(const Arguments &given) {
+  const char *path = given.operands[0];
   const OpenFile open(path);
-  if (!open.isOpen()) return false;
+  if (!open.isOpen()) return 1;
   TextWriter textWriter(stdout);
   JsonWriter jsonWriter(stdout);
-  Visitor *writer = asJson ? static_cast<Visitor *>(&jsonWriter) : &textWriter;
+  Visitor *writer = given.Has(kJson) ? static_cast<Visitor *>(&jsonWriter) : &textWriter;
   std::string problem;
-  if (VisitAll(open.file(), writer, &problem)) return true;
-  fprintf(stderr, "kifcache: %s: %s\n", path,
-          ZLK_ReturnStatusToString(KIF_STATUS_DAMAGED_CACHE_FILE));
-  return false;
+  if (VisitAll(open.file(), writer, &problem)) return 0;
+  Complain(path, ZLK_ReturnStatusToString(KIF_STATUS_DAMAGED_CACHE_FILE));
+  return 1;
 }
 
-bool Build(const char *textPath, const char *path) {
+int Build(const Arguments &given) {
+  const char *textPath = given.operands[0];
   std::string text;
-  if (!ReadFile(textPath, &text)) return false;
+  if (!ReadFile(textPath, &text)) return 1;
   HostModel model;
   const char *name = strcmp(textPath, "-") == 0 ? "(standard input)" : textPath;
-  return ReadText(text, name, &model) && WriteCacheFile(model, path);
+  return ReadText(text, name, &model) && WriteCacheFile(model, given.operands[1]) ? 0 : 1;
 }
 
-bool Fail(const char *usage) {
-  fputs(usage, stderr);
-  return false;
+int Nodes(const Arguments &) {
+  PrintNodes(stdout);
+  return 0;
 }
 
-bool Run(int argc, char **argv) {
-  const std::string_view command = argc > 1 ? argv[1] : "";
-  const std::string_view option = argc > 2 ? argv[2] : "";
-  if (command == "record") {
-    const bool redact = option == "--redact";
-    if (argc == (redact ? 4 : 3)) return Record(argv[argc - 1], redact);
-  } else if (command == "check" && argc == 3) {
-    return Check(argv[2]);
-  } else if (command == "dump") {
-    const bool asJson = option == "--json";
-    if (argc == (asJson ? 4 : 3)) return Dump(argv[argc - 1], asJson);
-  } else if (command == "build" && argc == 4) {
-    return Build(argv[2], argv[3]);
-  } else if (command == "nodes" && argc == 2) {
-    PrintNodes(stdout);
-    return true;
-  } else if (command == "--help" && argc == 2) {
-    fputs(kUsage, stdout);
-    return true;
-  } else if (command == "--version" && argc == 2) {
-    puts("kifcache " KIFCACHE_VERSION);
-    return true;
-  }
-  return Fail(kUsage);
+int Version() {
+  const char *libraryDate = "unknown";
+  (void)KIF_CheckSig(nullptr, 0, &libraryDate);
+  printf("kifcache " KIFCACHE_VERSION "\nlibrary of %s\n", libraryDate);
+  printf("writes file format %d.%d, reads %d.0 and every later %d.x\n", kCacheMajorVersion,
+         kCacheMinorVersion, kCacheMajorVersion, kCacheMajorVersion);
+  return 0;
 }
 
 }  // namespace
 
+const Command kCommands[] = {
+    {"record", "FILE", "save this host into FILE", Record, {&kRedact}},
+    {"check", "FILE", "verify FILE and tell what is in it", Check, {}},
+    {"dump", "FILE", "print what FILE holds as text", Dump, {&kJson}},
+    {"build", "TEXT FILE", "make FILE from the text that dump prints", Build, {}},
+    {"nodes", "", "list the nodes and the named fields of their records", Nodes, {}},
+    {},
+};
+
 int main(int argc, char **argv) {
   EndWhenOutOfMemory();
-  const bool done = Run(argc, argv);
+  const bool asksVersion = argc == 2 && strcmp(argv[1], "--version") == 0;
+  const int status = asksVersion ? Version() : RunCommandLine(argc, argv);
   const bool failedBefore = ferror(stdout) != 0;
-  if (fflush(stdout) == 0 && !failedBefore) return done ? 0 : 1;
+  if (fflush(stdout) == 0 && !failedBefore) return status;
   if (errno != EPIPE) fprintf(stderr, "kifcache: write error: %s\n", strerror(errno));
-  return 1;
+  return status != 0 ? status : 1;
 }

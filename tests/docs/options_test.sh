@@ -124,12 +124,15 @@ check_signals() {
 }
 
 check_kifcache() {
-  local page=$top/man/kifcache.1 usage words
-  usage=$("$bin/kifcache" --help)
-  words="$(sed -nE 's/^  ([a-z]+).*/\1/p' <<<"$usage") $(options_in_text <<<"$usage")"
-  same kifcache usage "$words" 'man page' "$(items_in_page "$page") $(options_in_page "$page")"
-  same kifcache usage "$words" completion \
-    "$(completed kifcache '') $(completed kifcache record -) $(completed kifcache dump -)"
+  local page=$top/man/kifcache.1 usage commands words completed command PATH=$bin:$PATH
+  usage=$(kifcache --help)
+  commands=$(sed -nE 's/^  ([a-z]+).*/\1/p' <<<"$usage")
+  words="$commands $(options_in_text <<<"$usage")"
+  same kifcache usage "$words" 'man page' \
+    "$(items_in_page "$page") $(options_in_page "$page" | tr -d :)"
+  completed=$(completed kifcache '')
+  for command in $commands; do completed+=" $(completed kifcache "$command" - | tr -d =)"; done
+  same kifcache usage "$words" completion "$completed"
 }
 
 # shellcheck source=/dev/null

@@ -1,0 +1,17 @@
+#include "messages.h"
+
+#include <stdio.h>
+
+#include "printable/printable.h"
+
+std::string Masked(std::string_view word) {
+  std::string masked(word);
+  printable::MaskControls(masked.data(), masked.size());
+  return masked;
+}
+
+bool Complain(std::string_view about, std::string_view message) {
+  const std::string line = Masked(std::string(about) + ": " + std::string(message));
+  fprintf(stderr, "kifcache: %s\n", line.c_str());
+  return false;
+}
