@@ -88,7 +88,7 @@ void OpenReport() {
 }
 
 KIF_Status FailStatus() {
-  return NumberFrom("FAIL_STATUS", KIF_STATUS_FAILURE);
+  return NumberFrom("FAIL_STATUS", 0xbad0001);
 }
 
 template <typename Operation>
