@@ -128,7 +128,7 @@ TEST_F(DispatcherTest, ForeignInterface) {
 
 TEST_F(DispatcherTest, FullDiskAndClosedOutput) {
   const std::string file = Record(kHost);
-  const std::string run = "ZELLIBS_HOST=" + file + " " BIN_DIR "/uptime ";
+  const std::string run = "ZELLIBS_HOST=" + file + " \"$BIN_DIR\"/uptime ";
   Outcome outcome = Run({"sh", "-c", run + ">/dev/full"});
   EXPECT_EQ(outcome.status, 1);
   EXPECT_EQ(outcome.err, "zlkkiftools: write error: No space left on device\n");
@@ -138,7 +138,7 @@ TEST_F(DispatcherTest, FullDiskAndClosedOutput) {
   // A failure of the tool keeps its own status.
   outcome = Run({"sh", "-c",
                  "ZELLIBS_HOST=" + Record("record system_ntpclock_upTime = seconds=1") +
-                     " " BIN_DIR "/uptime >/dev/full"});
+                     " \"$BIN_DIR\"/uptime >/dev/full"});
   EXPECT_EQ(outcome.status, 3);
 }
 
@@ -149,7 +149,7 @@ TEST_F(DispatcherTest, ReaderThatGoesAway) {
     host += "\nrecord userworld_cartel_cmdline " + std::to_string(i) + " = cmdline=\"program\"";
   }
   const Outcome outcome =
-      Run({"bash", "-c", BIN_DIR "/pgrep -l . | head -n 1; echo ${PIPESTATUS[0]}"},
+      Run({"bash", "-c", "\"$BIN_DIR\"/pgrep -l . | head -n 1; echo ${PIPESTATUS[0]}"},
           {.environment = {"ZELLIBS_HOST=" + Record(host + "\n")}});
   EXPECT_EQ(outcome.out, "1 program\n141\n");  // 128 and SIGPIPE
   EXPECT_EQ(outcome.err, "");

@@ -40,8 +40,9 @@ std::vector<char *> Pointers(const std::vector<std::string> &texts) {
 std::vector<std::string> Environment(const std::vector<std::string> &added) {
   // The first value of a name counts.
   std::vector<std::string> environment = added;
-  environment.insert(environment.end(), {"PATH=/usr/sbin:/usr/bin:/sbin:/bin", "TZ=UTC",
-                                         "ASAN_OPTIONS=detect_leaks=1"});
+  environment.insert(environment.end(),
+                     {"PATH=/usr/sbin:/usr/bin:/sbin:/bin", "TZ=UTC", "BIN_DIR=" BIN_DIR,
+                      "LIB_DIR=" LIB_DIR, "ASAN_OPTIONS=detect_leaks=1"});
   return environment;
 }
 
@@ -129,6 +130,14 @@ Outcome HostTest::RunTool(const std::vector<std::string> &commandLine, Surroundi
 
 Outcome HostTest::Run(const std::vector<std::string> &commandLine, Surroundings surroundings) {
   const std::string directory = surroundings.directory.empty() ? scratch_ : surroundings.directory;
+  std::string preloaded;
+  for (const std::string &library : surroundings.preloaded) {
+    preloaded += (preloaded.empty() ? "" : ":") + Preload(library);
+  }
+  if (!preloaded.empty()) {
+    surroundings.environment.push_back("LD_PRELOAD=" + preloaded);
+    surroundings.environment.push_back("ASAN_OPTIONS=verify_asan_link_order=0:detect_leaks=1");
+  }
   const std::vector<std::string> environment = Environment(surroundings.environment);
   std::vector<char *> arguments = Pointers(commandLine);
   std::vector<char *> variables = Pointers(environment);
@@ -153,6 +162,15 @@ Outcome HostTest::Run(const std::vector<std::string> &commandLine, Surroundings 
   }
   outcome.status = WIFSIGNALED(status) ? -WTERMSIG(status) : WEXITSTATUS(status);
   return outcome;
+}
+
+std::string HostTest::Link(const std::string &path) {
+  const std::filesystem::path target = path;
+  const std::filesystem::path link = std::filesystem::path(scratch_) / ".links" / target.filename();
+  std::error_code exists;
+  std::filesystem::create_directories(link.parent_path());
+  std::filesystem::create_symlink(target, link, exists);
+  return link.string();
 }
 
 std::string HostTest::WriteFile(const std::string &path, const std::string &bytes) {

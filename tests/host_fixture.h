@@ -18,6 +18,7 @@ struct Surroundings {
   std::vector<std::string> environment = {};  // "NAME=value", added to the test's own
   std::string directory = {};                 // working directory; empty: the test's scratch folder
   std::string input = {};                     // standard input
+  std::vector<std::string> preloaded = {};    // libraries of the test build, see Preload()
 };
 
 class HostTest : public testing::Test {
@@ -41,8 +42,20 @@ class HostTest : public testing::Test {
   Outcome Linux(const std::string &root, const std::vector<std::string> &arguments,
                 Surroundings surroundings = {});
 
-  // Runs any program: its path or name first.
+  // Runs any program: its path or name first. A shell finds the folders of the build in the
+  // variables BIN_DIR and LIB_DIR.
   Outcome Run(const std::vector<std::string> &commandLine, Surroundings surroundings = {});
+
+  // A path without blanks or colons, which LD_PRELOAD cannot take, of a library of the test build:
+  //   FAULT_INJECT   makes calls of the program fail (fault/fault.h)
+  //   HWDATA_FOLDER  gives it PCI ID files from the folder that the variable HWDATA_FOLDER names,
+  //   in
+  //                  place of those in /usr/share/hwdata (pci/pci_fixture.h)
+  //   LSTAT_DEVICE   makes files look like those of the in-memory file system (fsstats/)
+  std::string Preload(const std::string &library) { return Link(library); }
+
+  // A link to a file or folder, by a path without blanks, colons or other signs.
+  std::string Link(const std::string &path);
 
   // Writes a file below the scratch folder, with the folders it needs, and gives its path.
   std::string WriteFile(const std::string &path, const std::string &bytes);

@@ -205,6 +205,7 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
                            const std::string &arguments, const std::string &host) {
   // FAIL=operation:n[:status] becomes the words that the preloaded library knows.
   std::string line = words;
+  std::string preloaded;
   std::smatch fail;
   if (std::regex_search(line, fail, std::regex("FAIL=(\\w+):(\\d+)(\\+?)(:(\\w+))? "))) {
     std::string variables = fail[3].length() > 0 ? "FAIL_FROM=1 " : "";
@@ -213,8 +214,13 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
       variables += word + " ";
     }
     line = fail.prefix().str() + variables + fail.suffix().str();
+    preloaded = Preload(FAULT_INJECT);
   }
-  line = "PATH=" BIN_DIR ":$PATH\n" + line + program + arguments;
+  if (line.find("HWDATA_FOLDER=") != line.npos) preloaded += ":" + Preload(HWDATA_FOLDER);
+  if (!preloaded.empty()) {
+    line += "LD_PRELOAD=" + preloaded + " ASAN_OPTIONS=verify_asan_link_order=0:detect_leaks=1 ";
+  }
+  line = "PATH=" + Link(BIN_DIR) + ":$PATH\n" + line + program + arguments;
   std::vector<std::string> run = {"sh", "-c", line};
   if (line.find("pkill") != line.npos) {
     // Whatever pkill does, it reaches no process but those of this command.
@@ -227,7 +233,7 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
   }
   const Outcome outcome =
       Run(run, {.environment = {"ZELLIBS_HOST=" + host, "ZELLIBS_TRACE=" + Scratch() + "/trace",
-                                "SOURCE=" SOURCE_DIR, "LSTAT_DEVICE=" LSTAT_DEVICE,
+                                "SOURCE=" SOURCE_DIR, "LSTAT_DEVICE=" + Preload(LSTAT_DEVICE),
                                 "ASAN_OPTIONS=detect_leaks=1:verify_asan_link_order=0"}});
   Lines lines = Readable(outcome);
   if (ReadFile(Scratch() + "/trace").find("never destroyed") != std::string::npos) {

@@ -76,14 +76,15 @@ TEST_F(Isolation, CacheRunsInAnEmptyRootDirectory) {
   const std::string root = Scratch() + "/root";
   if (Run({"unshare", "-r", "true"}).status != 0) GTEST_SKIP() << "no user namespaces";
   WriteFile("root/host.kif", ReadFile(Record(kWholeHost)));
-  const Outcome copied = Run({"sh", "-c",
-                              "cd '" + root +
-                                  "' && mkdir -p bin lib usr/share/hwdata folder && cp " BIN_DIR
-                                  "/zlkkiftools bin && cp " LIB_DIR "/libzellibs.so lib && "
-                                  "cp /usr/share/hwdata/pci.ids usr/share/hwdata && "
-                                  "for library in $(ldd bin/zlkkiftools lib/libzellibs.so | grep "
-                                  "-o ' /[^ ]*\\|^\t/[^ ]*');"
-                                  " do cp --parents \"$library\" . ; done 2>/dev/null"});
+  const Outcome copied =
+      Run({"sh", "-c",
+           "cd '" + root +
+               "' && mkdir -p bin lib usr/share/hwdata folder && cp \"$BIN_DIR\"/"
+               "zlkkiftools bin && cp \"$LIB_DIR\"/libzellibs.so lib && "
+               "cp /usr/share/hwdata/pci.ids usr/share/hwdata && "
+               "for library in $(ldd bin/zlkkiftools lib/libzellibs.so | grep "
+               "-o ' /[^ ]*\\|^\t/[^ ]*');"
+               " do cp --parents \"$library\" . ; done 2>/dev/null"});
   for (const Command &command : kCommands) {
     if (!command.onCache || command.arguments[0] == "uptime") continue;
     std::vector<std::string> commandLine = {

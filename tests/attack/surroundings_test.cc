@@ -102,7 +102,7 @@ TEST_F(SurroundingsTest, NoProc) {
   const std::vector<std::string> unshared = {"unshare", "-rm"};
   if (!Can(unshared)) GTEST_SKIP() << "no mount namespaces for this user";
   // Without /proc the loader cannot tell where the program stands.
-  OnThisMachine("mount -t tmpfs none /proc && LD_LIBRARY_PATH=" LIB_DIR " exec \"$@\"", unshared);
+  OnThisMachine("mount -t tmpfs none /proc && LD_LIBRARY_PATH=\"$LIB_DIR\" exec \"$@\"", unshared);
   OnThisMachine("mount -t tmpfs none /sys && exec \"$@\"", unshared);
 }
 

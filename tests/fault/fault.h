@@ -12,11 +12,10 @@ inline Surroundings Failing(const std::string &operation, int call,
                             const std::string &status = "0xbad0001") {
   Surroundings surroundings;
   surroundings.environment = {
-      "LD_PRELOAD=" FAULT_INJECT,
       "FAIL_OPERATION=" + operation,
       "FAIL_CALL=" + std::to_string(call),
       "FAIL_STATUS=" + status,
-      "ASAN_OPTIONS=verify_asan_link_order=0:detect_leaks=1",
   };
+  surroundings.preloaded = {FAULT_INJECT};
   return surroundings;
 }

@@ -20,7 +20,7 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
-#include "zellibs.h"
+#include "kif/kif.h"
 
 namespace {
 

@@ -124,9 +124,9 @@ record userworld_cartel_cmdline 7 = cmdline="other"
 record userworld_cartel_cmdline @ = cmdline="pgrep only here"
 )");
   const std::string start = "cd " + Scratch() + " && sed s/@/$$/ " + text +
-                            " >own.txt && " BIN_DIR "/kifcache build own.txt own.cache && ";
+                            " >own.txt && \"$BIN_DIR\"/kifcache build own.txt own.cache && ";
   const std::string live =
-      start + "ZELLIBS_HOST=own.cache exec " BIN_DIR "/zlkkiftools pgrep -f \"$@\"";
+      start + "ZELLIBS_HOST=own.cache exec \"$BIN_DIR\"/zlkkiftools pgrep -f \"$@\"";
   Outcome outcome = Run({"/bin/sh", "-c", live, "sh", "only here"});
   EXPECT_EQ(outcome.out, "");
   EXPECT_EQ(outcome.status, 0);  // it matched all the same
@@ -135,7 +135,7 @@ record userworld_cartel_cmdline @ = cmdline="pgrep only here"
   EXPECT_EQ(outcome.status, 0);
 
   const std::string cache =
-      start + "echo $$; exec " BIN_DIR "/zlkkiftools -c own.cache pgrep -f 'only here'";
+      start + "echo $$; exec \"$BIN_DIR\"/zlkkiftools -c own.cache pgrep -f 'only here'";
   outcome = Run({"/bin/sh", "-c", cache});
   const std::string id = outcome.out.substr(0, outcome.out.find('\n'));
   EXPECT_EQ(outcome.out, id + "\n" + id + " \b\n");

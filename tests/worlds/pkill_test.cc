@@ -253,10 +253,11 @@ TEST_F(PkillTest, IgnoresCartelsThatHaveEnded) {
 TEST_F(PkillTest, LeavesItselfAlone) {
   const std::string text =
       WriteFile("self.txt", HostOf({{"@", "cmdline=\"one\""}, {one_.text(), "cmdline=\"one\""}}));
-  const std::string command = "cd " + Scratch() + " && sed s/@/$$/ " + text +
-                              " >own.txt && " BIN_DIR
-                              "/kifcache build own.txt own.cache && "
-                              "ZELLIBS_HOST=own.cache exec " BIN_DIR "/zlkkiftools pkill -KILL one";
+  const std::string command =
+      "cd " + Scratch() + " && sed s/@/$$/ " + text +
+      " >own.txt && \"$BIN_DIR\""
+      "/kifcache build own.txt own.cache && "
+      "ZELLIBS_HOST=own.cache exec \"$BIN_DIR\"/zlkkiftools pkill -KILL one";
   const Outcome outcome = Run({"/bin/sh", "-c", command});
   EXPECT_EQ(outcome.status, 0);
   EXPECT_EQ(WTERMSIG(one_.WaitForChange()), SIGKILL);
