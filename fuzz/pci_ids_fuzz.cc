@@ -1,18 +1,10 @@
 // Any bytes as PCI ID files: the input is cut into files at its bytes 0xFF, the last one being the
 // published file. Whatever the tables hold then, a look-up gives what was asked for or nothing.
-#include <stdarg.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 
-#include "kiftools.h"
 #include "pci/pci_ids.h"
-
-// The dispatcher is not part of this program. The list of files panics only for want of memory.
-void Panic(const char *, ...) {
-  abort();
-}
-void Warning(const char *, ...) {}
 
 namespace {
 

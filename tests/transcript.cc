@@ -11,9 +11,9 @@
 #include <set>
 #include <sstream>
 
+#include "base/utf8.h"
 #include "fault/fault.h"
 #include "host_fixture.h"
-#include "printable/printable.h"
 
 namespace {
 
@@ -62,7 +62,7 @@ Lines Readable(const std::string &bytes, const std::string &prefix) {
     }
     for (size_t i = 0; i < line.size();) {
       const auto *at = reinterpret_cast<const unsigned char *>(line.data()) + i;
-      const size_t length = printable::SequenceLength(at, line.size() - i);
+      const size_t length = SequenceLength(at, line.size() - i);
       char escape[8] = {line[i]};
       if (*at == '\t') snprintf(escape, sizeof(escape), "\\t");
       if (*at == '\\') snprintf(escape, sizeof(escape), "\\\\");

@@ -4,12 +4,6 @@
 #include <string>
 #include <string_view>
 
-// Length in bytes of the valid UTF-8 character of two bytes or more that `text` begins with, 0
-// when it begins with none.
-size_t LongCharacterAt(std::string_view text);
-
-bool IsUtf8(std::string_view text);
-
 // `text` in double quotes as the text form has it: control characters and bytes that are no UTF-8
 // are written out, so that it can be shown on a terminal.
 std::string Quoted(std::string_view text);

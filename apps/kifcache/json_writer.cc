@@ -2,6 +2,7 @@
 
 #include <cinttypes>
 
+#include "base/utf8.h"
 #include "encoding.h"
 #include "record_parts.h"
 
@@ -9,7 +10,8 @@ namespace {
 
 // JSON has no bytes: a text that is no UTF-8 is an object with its bytes in hexadecimal.
 std::string Text(std::string_view text) {
-  return IsUtf8(text) ? JsonString(text) : "{\"hex\":\"" + HexDigits(text) + "\"}";
+  return IsUtf8(text.data(), text.size()) ? JsonString(text)
+                                          : "{\"hex\":\"" + HexDigits(text) + "\"}";
 }
 
 std::string Array(const Values &values) {

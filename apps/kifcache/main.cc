@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <cstring>
+#include <new>
 #include <string>
 
 #include "cache_file.h"
@@ -14,7 +15,6 @@
 #include "command_line.h"
 #include "host_model.h"
 #include "json_writer.h"
-#include "memory.h"
 #include "messages.h"
 #include "node_table.h"
 #include "recorder.h"
@@ -109,6 +109,15 @@ int Version() {
   printf("writes file format %d.%d, reads %d.0 and every later %d.x\n", kCacheMajorVersion,
          kCacheMinorVersion, kCacheMajorVersion, kCacheMajorVersion);
   return 0;
+}
+
+// Makes every allocation that fails end the process with a message and status 1.
+void EndWhenOutOfMemory() {
+  std::set_new_handler([] {
+    constexpr char kMessage[] = "kifcache: out of memory\n";
+    (void)!write(STDERR_FILENO, kMessage, sizeof(kMessage) - 1);
+    _exit(1);
+  });
 }
 
 }  // namespace

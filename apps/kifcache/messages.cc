@@ -2,11 +2,11 @@
 
 #include <stdio.h>
 
-#include "printable/printable.h"
+#include "base/utf8.h"
 
 std::string Masked(std::string_view word) {
   std::string masked(word);
-  printable::MaskControls(masked.data(), masked.size());
+  MaskControls(masked.data(), masked.size());
   return masked;
 }
 

@@ -11,6 +11,8 @@
 #include <cstring>
 #include <string>
 
+#include "base/io.h"
+
 namespace {
 
 bool Fail(const char *path, int error) {
@@ -36,19 +38,6 @@ class SignalsHeld {
   sigset_t before_;
 };
 
-// 0, or what went wrong.
-int WriteAll(int descriptor, const void *bytes, size_t size) {
-  const char *rest = static_cast<const char *>(bytes);
-  while (size > 0) {
-    const ssize_t written = write(descriptor, rest, size);
-    if (written == -1 && errno == EINTR) continue;
-    if (written <= 0) return written == 0 ? ENOSPC : errno;
-    rest += written;
-    size -= static_cast<size_t>(written);
-  }
-  return fsync(descriptor) == 0 ? 0 : errno;
-}
-
 // A rename is on disk when its directory is; a directory that cannot be flushed is left at that.
 void FlushDirectory(const std::string &path) {
   const size_t slash = path.rfind('/');
@@ -73,6 +62,7 @@ bool ReplaceFile(const char *path, const void *bytes, size_t size) {
   const int descriptor = mkostemp(temporary.data(), O_CLOEXEC);  // mode 0600
   if (descriptor == -1) return Fail(path, errno);
   int error = WriteAll(descriptor, bytes, size);
+  if (error == 0 && fsync(descriptor) != 0) error = errno;
   if (close(descriptor) != 0 && error == 0) error = errno;
   if (error == 0 && rename(temporary.c_str(), path) != 0) error = errno;
   if (error != 0) {

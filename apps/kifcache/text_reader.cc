@@ -7,6 +7,8 @@
 #include <cstring>
 #include <limits>
 
+#include "base/hex.h"
+
 namespace {
 
 constexpr uint32_t kMostContent = uint32_t{64} << 20;  // of a content that is written out
@@ -39,13 +41,6 @@ bool Fits(const Number &number, uint32_t size) {
   const auto value = static_cast<int64_t>(number.bits);
   if (number.negative) return size == 8 || value >= -(int64_t{1} << (size * 8 - 1));
   return size == 8 || number.bits >> (size * 8) == 0;
-}
-
-int HexDigit(char digit) {
-  if (digit >= '0' && digit <= '9') return digit - '0';
-  if (digit >= 'a' && digit <= 'f') return digit - 'a' + 10;
-  if (digit >= 'A' && digit <= 'F') return digit - 'A' + 10;
-  return -1;
 }
 
 bool ParseHex(std::string_view digits, std::string *bytes) {

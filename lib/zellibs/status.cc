@@ -45,6 +45,8 @@ KIF_Status StatusOfErrno(int error) {
       return KIF_STATUS_NO_PERMISSION;
     case ENOMEM:
       return KIF_STATUS_NO_MEMORY;
+    case EFBIG:
+      return KIF_STATUS_TOO_LARGE;
     case EMFILE:
     case ENFILE:
       return KIF_STATUS_NO_RESOURCES;

@@ -21,5 +21,6 @@
 #define KIF_STATUS_NO_COMMAND_LINE 0xbad0062u
 
 // The status for a failed system call: gone (ENOENT, ESRCH, ENODEV, ENXIO) is not found, EACCES and
-// EPERM are no permission, ENOMEM is out of memory, and anything else an input/output error.
+// EPERM are no permission, ENOMEM is out of memory, EFBIG too large, and anything else an
+// input/output error.
 KIF_Status StatusOfErrno(int error);

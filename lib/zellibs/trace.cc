@@ -8,8 +8,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "base/utf8.h"
 #include "param_list.h"
-#include "printable/printable.h"
 #include "status.h"
 
 namespace {
@@ -44,7 +44,7 @@ class Line {
   // One write a line, so that the lines of several processes do not mix; and a text with a line
   // break in it makes no line of its own.
   void Write() {
-    printable::MaskControls(text_, length_);
+    MaskControls(text_, length_);
     text_[length_] = '\n';
     if (write(descriptor, text_, length_ + 1) < 0) tracing = Tracing::kOff;
   }

@@ -3,10 +3,10 @@
 #include <stdio.h>
 #include <unistd.h>
 
-#include "fsstats/volume_stats.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"
+#include "records/morelfs.h"
 #include "tools.h"
 
 namespace {
@@ -123,7 +123,7 @@ bool DiskTable(KIF_NodeId volumes, KIF_NodeId statsNode, const char *prefix, con
     KIF_Param *param = KIF_ParamListGetParam(names.get(), static_cast<uint32_t>(i));
     const char *name = param != nullptr ? KIF_ParamGetString(param) : nullptr;
     Stats stats = {};
-    status = ReadVolumeStats(statsNode, name, &stats);
+    status = ReadRecordOf(statsNode, name, &stats);
     if (name == nullptr) name = "";
     if (status == 0) {
       printRow(view, Shown(name).text(), stats);

@@ -9,7 +9,8 @@
 
 #include <memory>
 
-#include "free_deleter.h"
+#include "base/bytes.h"
+#include "base/free_deleter.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"
@@ -49,13 +50,6 @@ struct Walk {
   const Options &options;
   size_t capacity;  // buckets in an array
   char path[kPathSize];
-};
-
-// The names in a directory, each one ended, one after the other.
-struct EntryNames {
-  std::unique_ptr<char, FreeDeleter> bytes;
-  size_t length = 0;
-  size_t capacity = 0;
 };
 
 int Usage() {
@@ -167,28 +161,13 @@ __attribute__((noinline)) Measured Measure(const Walk &walk, const char *path,
   return stats.size != 0 ? Measured::kFile : Measured::kEmptyFile;
 }
 
-bool AddName(EntryNames *names, const char *name) {
-  const size_t size = strlen(name) + 1;
-  if (size > names->capacity - names->length) {
-    const size_t capacity = 2 * names->capacity + size;
-    void *grown = realloc(names->bytes.get(), capacity);
-    if (grown == nullptr) return false;
-    (void)names->bytes.release();
-    names->bytes.reset(static_cast<char *>(grown));
-    names->capacity = capacity;
-  }
-  memcpy(names->bytes.get() + names->length, name, size);
-  names->length += size;
-  return true;
-}
-
 // False when the directory cannot be opened. It is closed again before the walk goes down: a tree
 // may have more levels than a process has descriptors.
-bool ReadDirectory(const char *path, EntryNames *names) {
+bool ReadDirectory(const char *path, Bytes *names) {
   DIR *directory = opendir(path);
   if (directory == nullptr) return false;
   while (const struct dirent *entry = readdir(directory)) {
-    if (AddName(names, entry->d_name)) continue;
+    if (names->Append(entry->d_name, strlen(entry->d_name) + 1)) continue;
     fputs("unable to allocate memory for stats", stderr);
     break;
   }
@@ -250,7 +229,7 @@ void WalkEntry(Walk *walk, const char *name, Level *level) {
 
 // Walks the directory at `path`, whose own bucket is filled; gives the number of filled ones.
 size_t WalkDirectory(Walk *walk, const char *path, uint32_t depth, DustatsBucket *buckets) {
-  EntryNames names;
+  Bytes names;  // each one ended
   if (!ReadDirectory(path, &names)) return 0;
   const size_t length = strlen(path);
   const bool hasSlash = length > 0 && path[length - 1] == '/';
@@ -262,8 +241,8 @@ size_t WalkDirectory(Walk *walk, const char *path, uint32_t depth, DustatsBucket
   }
   if (path != walk->path) memcpy(walk->path, path, length);
   walk->path[level.prefix - 1] = '/';
-  const char *name = names.bytes.get();
-  for (const char *end = name + names.length; name < end; name += strlen(name) + 1) {
+  const char *name = names.text();
+  for (const char *end = name + names.size(); name < end; name += strlen(name) + 1) {
     WalkEntry(walk, name, &level);
   }
   walk->path[length] = '\0';

@@ -51,6 +51,15 @@ KIF_Status ReadRecord(KIF_NodeId node, KIF_ParamList *instance, Record *record) 
   return KIF_Get(node, instance, record, sizeof(Record));
 }
 
+// The same for the instance that has the text `name` for its one parameter.
+template <typename Record>
+KIF_Status ReadRecordOf(KIF_NodeId node, const char *name, Record *record) {
+  const ParamListHandle instance = CreateInstance();
+  if (instance == nullptr) return KIF_STATUS_NO_MEMORY;
+  const KIF_Status status = KIF_ParamListAddString(instance.get(), name);
+  return status != 0 ? status : ReadRecord(node, instance.get(), record);
+}
+
 // Ends the text in a record's field at the field's last byte at the latest, and gives it.
 template <size_t Size>
 char *FieldText(char (&field)[Size]) {

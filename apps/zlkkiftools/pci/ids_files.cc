@@ -10,17 +10,20 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "kiftools.h"
+#include "base/bytes.h"
 
 namespace {
 
-constexpr size_t kInitialCapacity = 8;
 constexpr size_t kLongestPath = 255;
 constexpr size_t kLongestLine = 255;
-constexpr size_t kInitialRead = 65536;
+
+[[noreturn]] void EndWith(const char *message) {
+  fputs(message, stderr);
+  exit(1);
+}
 
 [[noreturn]] void OutOfMemory() {
-  Panic("Not enough memory for file list\n");
+  EndWith("Not enough memory for file list\n");
 }
 
 // Maps a regular file, which costs an eighth of reading it: fresh memory is what is expensive.
@@ -35,27 +38,6 @@ char *MapFile(int descriptor, size_t *size) {
   return bytes != MAP_FAILED ? static_cast<char *>(bytes) : nullptr;
 }
 
-// Reads the rest of `descriptor` into a new allocation at `*bytes`; a failed read ends the file.
-size_t ReadAll(int descriptor, char **bytes) {
-  size_t capacity = kInitialRead;
-  size_t size = 0;
-  char *buffer = static_cast<char *>(malloc(capacity));
-  if (buffer == nullptr) OutOfMemory();
-  for (;;) {
-    const ssize_t got = read(descriptor, buffer + size, capacity - size);
-    if (got < 0 && errno == EINTR) continue;
-    if (got <= 0) break;
-    size += static_cast<size_t>(got);
-    if (size < capacity) continue;
-    capacity *= 2;
-    char *grown = static_cast<char *>(realloc(buffer, capacity));
-    if (grown == nullptr) OutOfMemory();
-    buffer = grown;
-  }
-  *bytes = buffer;
-  return size;
-}
-
 bool IsIdsFileName(std::string_view name) {
   return name.size() >= 5 && name.ends_with(".ids");
 }
@@ -63,19 +45,10 @@ bool IsIdsFileName(std::string_view name) {
 }  // namespace
 
 PciIdsFileList::File *PciIdsFileList::Append(const char *path) {
-  if (strlen(path) > kLongestPath) Panic("Found corrupted file name\n");
-  if (count_ == capacity_) {
-    const size_t capacity = capacity_ == 0 ? kInitialCapacity : capacity_ * 2;
-    auto *grown = static_cast<File *>(realloc(files_, capacity * sizeof(File)));
-    if (grown == nullptr) OutOfMemory();
-    files_ = grown;
-    capacity_ = capacity;
-  }
-  File *file = &files_[count_];
-  *file = {.path = strdup(path)};
-  if (file->path == nullptr) OutOfMemory();
-  ++count_;
-  return file;
+  if (strlen(path) > kLongestPath) EndWith("Found corrupted file name\n");
+  File file = {.path = strdup(path)};
+  if (file.path == nullptr || !files_.Append(file)) OutOfMemory();
+  return files_.end() - 1;
 }
 
 void PciIdsFileList::AddPath(const char *path) {
@@ -97,7 +70,7 @@ void PciIdsFileList::AddDirectory(const char *directory) {
   DIR *listing = opendir(directory);
   if (listing == nullptr) return;
   while (const dirent *entry = readdir(listing)) {
-    if (strlen(entry->d_name) > kLongestPath) Panic("Found corrupted file name\n");
+    if (strlen(entry->d_name) > kLongestPath) EndWith("Found corrupted file name\n");
     if (!IsIdsFileName(entry->d_name)) continue;
     char path[kLongestPath + 2];  // one more than allowed, so that Append notices
     snprintf(path, sizeof(path), "%s/%s", directory, entry->d_name);
@@ -106,20 +79,27 @@ void PciIdsFileList::AddDirectory(const char *directory) {
   closedir(listing);
 }
 
-// static
+// A failed read ends the file.
+void PciIdsFileList::Read(int descriptor, File *file) {
+  Bytes bytes;
+  if (bytes.ReadAll(descriptor, SIZE_MAX) == ENOMEM) OutOfMemory();
+  file->size = bytes.size();
+  file->bytes = bytes.Release();
+}
+
 void PciIdsFileList::Load(File *file) {
   file->read = true;
   const int descriptor = open(file->path, O_RDONLY | O_CLOEXEC);
   if (descriptor < 0) return;
   file->bytes = MapFile(descriptor, &file->size);
   file->mapped = file->bytes != nullptr;
-  if (!file->mapped) file->size = ReadAll(descriptor, &file->bytes);
+  if (!file->mapped) Read(descriptor, file);
   file->hasNul = memchr(file->bytes, '\0', file->size) != nullptr;
   close(descriptor);
 }
 
 bool PciIdsFileList::NextLine(std::string_view *line) {
-  for (; current_ < count_; ++current_) {
+  for (; current_ < files_.size(); ++current_) {
     File *file = &files_[current_];
     if (!file->read) Load(file);
     const size_t left = file->size - position_;
@@ -146,15 +126,13 @@ void PciIdsFileList::Rewind() {
   lineNumber_ = 0;
 }
 
-void PciIdsFileList::Destroy() {
-  for (size_t i = 0; i < count_; ++i) {
-    free(files_[i].path);
-    if (files_[i].mapped) {
-      munmap(files_[i].bytes, files_[i].size);
+PciIdsFileList::~PciIdsFileList() {
+  for (const File &file : files_) {
+    free(file.path);
+    if (file.mapped) {
+      munmap(file.bytes, file.size);
     } else {
-      free(files_[i].bytes);
+      free(file.bytes);
     }
   }
-  free(files_);
-  *this = PciIdsFileList();
 }

@@ -4,12 +4,19 @@
 #include <cstddef>
 #include <string_view>
 
+#include "base/array.h"
+
 // An ordered list of files and a cursor over their lines. A file is read once, when the cursor
 // first comes to it; a file that cannot be opened has no lines. Lines, paths and the bytes behind
-// them stay valid until Destroy. Being out of memory, and a path that is too long, end the process
+// them live as long as the list. Being out of memory, and a path that is too long, end the process
 // with a message and status 1.
 class PciIdsFileList {
  public:
+  PciIdsFileList() = default;
+  ~PciIdsFileList();
+  PciIdsFileList(PciIdsFileList &&other) = default;
+  PciIdsFileList &operator=(PciIdsFileList &&other) = default;
+
   // Appends a file by its path, of at most 255 characters.
   void AddPath(const char *path);
 
@@ -26,15 +33,12 @@ class PciIdsFileList {
 
   // Of the line that NextLine gave last: the path of its file, its number in that file from 1, and
   // whether the file is another than the last of the list.
-  const char *CurrentPath() const { return current_ < count_ ? files_[current_].path : ""; }
+  const char *CurrentPath() const { return current_ < files_.size() ? files_[current_].path : ""; }
   int LineNumber() const { return lineNumber_; }
-  bool InOverrideFile() const { return current_ + 1 < count_; }
+  bool InOverrideFile() const { return current_ + 1 < files_.size(); }
 
   // Goes back to the first line of the first file.
   void Rewind();
-
-  // Releases everything; the list is then empty.
-  void Destroy();
 
  private:
   struct File {
@@ -48,10 +52,9 @@ class PciIdsFileList {
 
   File *Append(const char *path);
   static void Load(File *file);
+  static void Read(int descriptor, File *file);
 
-  File *files_ = nullptr;
-  size_t count_ = 0;
-  size_t capacity_ = 0;
+  Array<File> files_;
   size_t current_ = 0;
   size_t position_ = 0;  // in the bytes of the current file
   int lineNumber_ = 0;

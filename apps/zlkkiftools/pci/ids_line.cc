@@ -1,5 +1,7 @@
 #include "pci/ids_line.h"
 
+#include "base/hex.h"
+
 namespace {
 
 // A text is read as if a NUL followed it.
@@ -9,25 +11,6 @@ char At(std::string_view text, size_t index) {
 
 bool IsBlank(char c) {
   return c == ' ' || c == '\t';
-}
-
-// What each character is worth as a hexadecimal digit; -1 when it is none.
-struct HexDigits {
-  int8_t values[256];
-
-  constexpr HexDigits() : values() {
-    for (int8_t &value : values) value = -1;
-    for (int8_t i = 0; i < 10; ++i) values['0' + i] = i;
-    for (int8_t i = 0; i < 6; ++i) {
-      values['a' + i] = static_cast<int8_t>(10 + i);
-      values['A' + i] = static_cast<int8_t>(10 + i);
-    }
-  }
-};
-constexpr HexDigits kHexDigits;
-
-int HexDigit(char c) {
-  return kHexDigits.values[static_cast<unsigned char>(c)];
 }
 
 size_t SkipBlanks(std::string_view text, size_t at) {

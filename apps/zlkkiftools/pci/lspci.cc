@@ -6,7 +6,8 @@
 
 #include <memory>
 
-#include "free_deleter.h"
+#include "base/free_deleter.h"
+#include "base/hex.h"
 #include "kif/kif.h"
 #include "output.h"
 #include "pci/pci_ids.h"
@@ -195,14 +196,11 @@ template <size_t Size>
 void PrintHexDump(const uint8_t (&bytes)[Size]) {
   constexpr size_t kRow = 16;
   static_assert(Size % kRow == 0);
-  constexpr char kDigits[] = "0123456789abcdef";
   for (size_t row = 0; row < Size; row += kRow) {
     char text[kRow * 3 + 1] = "";
     for (size_t i = 0; i < kRow; ++i) {
-      const uint8_t byte = bytes[row + i];
       text[i * 3] = ' ';
-      text[i * 3 + 1] = kDigits[byte >> 4];
-      text[i * 3 + 2] = kDigits[byte & 15];
+      PutHex(bytes[row + i], &text[i * 3 + 1]);
     }
     printf("%02zx:%s\n", row, text);
   }

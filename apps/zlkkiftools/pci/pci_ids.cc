@@ -5,9 +5,10 @@
 #include <string.h>
 
 #include <string_view>
+#include <utility>
 
-#include "kiftools.h"
-#include "output.h"
+#include "base/everlasting.h"
+#include "base/shown.h"
 #include "pci/ids_line.h"
 
 const char not_avail_prefix[] = "Name not available for ";
@@ -43,8 +44,8 @@ struct VendorRow {
   uint8_t nameLength;
 };
 
-PciIdsFileList idsFiles;  // the names' bytes
-VendorRow *VendorTable;   // the first row is for the devices above the first vendor line
+Everlasting<PciIdsFileList> idsFiles;  // the names' bytes
+VendorRow *VendorTable;  // the first row is for the devices above the first vendor line
 size_t nvendor;
 DeviceRow *PciDevTable;
 size_t ndevid;
@@ -60,7 +61,7 @@ void CopyName(char (&field)[Room], std::string_view name) {
 
 void ReportMalformed(int message) {
   fprintf(stderr, "%s: line %d improperly formatted(%d)\n",
-          Shown(idsFiles.CurrentPath(), stderr).text(), idsFiles.LineNumber(), message);
+          Shown(idsFiles->CurrentPath(), stderr).text(), idsFiles->LineNumber(), message);
 }
 
 // ndevid, and the rows that VendorTable needs, from the lines of the device section.
@@ -68,7 +69,7 @@ void CountDevices() {
   ndevid = 0;
   nvendor = 1;
   std::string_view line;
-  while (idsFiles.NextLine(&line)) {
+  while (idsFiles->NextLine(&line)) {
     switch (DeviceLineKind(line)) {
       case DeviceLine::kIgnored:
         break;
@@ -90,7 +91,7 @@ void CountClasses() {
   nclass = 0;
   ClassLine last = ClassLine::kIgnored;
   std::string_view line;
-  while (idsFiles.NextLine(&line)) {
+  while (idsFiles->NextLine(&line)) {
     const ClassLine kind = ClassLineKind(line);
     if (kind == ClassLine::kIgnored) continue;
     // The first prog-if line under a subclass takes the place of the subclass.
@@ -151,7 +152,7 @@ void AppendDevice(DevicePass *pass, uint16_t subVendorID, uint16_t subDeviceID,
                                   .subVendorID = subVendorID,
                                   .subDeviceID = subDeviceID,
                                   .nameLength = static_cast<uint8_t>(name.size())};
-  if (idsFiles.InOverrideFile()) ++overrideCount;
+  if (idsFiles->InOverrideFile()) ++overrideCount;
 }
 
 bool AddDevice(DevicePass *pass, std::string_view line) {
@@ -159,7 +160,7 @@ bool AddDevice(DevicePass *pass, std::string_view line) {
   std::string_view name;  // stays without a text when there is none in the line
   if (!ParseIdAndName(TextFrom(line, 1), kDeviceNameRoom, &number, &name) && !pass->HasVendor()) {
     fprintf(stderr, "%s: can't synthesize device name for line %d\n",
-            Shown(idsFiles.CurrentPath(), stderr).text(), idsFiles.LineNumber());
+            Shown(idsFiles->CurrentPath(), stderr).text(), idsFiles->LineNumber());
     return false;
   }
   pass->deviceID = static_cast<uint16_t>(number);
@@ -210,7 +211,7 @@ bool FillDevices() {
   overrideCount = 0;
   VendorTable[0] = {};
   std::string_view line;
-  while (idsFiles.NextLine(&line)) {
+  while (idsFiles->NextLine(&line)) {
     const DeviceLine kind = DeviceLineKind(line);
     if (kind == DeviceLine::kEnd || !AddDeviceLine(&pass, kind, line)) break;
   }
@@ -297,7 +298,7 @@ bool AddClassLine(ClassPass *pass, std::string_view line) {
 bool FillClasses() {
   ClassPass pass;
   std::string_view line;
-  while (idsFiles.NextLine(&line) && AddClassLine(&pass, line)) {
+  while (idsFiles->NextLine(&line) && AddClassLine(&pass, line)) {
   }
   if (pass.subclassPending) StoreSubclass(&pass);
   if (pass.stored == nclass) return true;
@@ -315,7 +316,7 @@ void CountEntries() {
   if (nclass == 0) {
     fprintf(stderr, "no class entries in %s\nPerhaps, corrupted file?\n", kPublishedFile);
   }
-  idsFiles.Rewind();
+  idsFiles->Rewind();
 }
 
 bool IsSynthesized(const DeviceRow &row) {
@@ -386,12 +387,12 @@ void ReleasePciTables() {
   PciDevTable = nullptr;
   PciClassCodeTable = nullptr;
   nvendor = ndevid = nclass = overrideCount = 0;
-  idsFiles.Destroy();
+  *idsFiles = PciIdsFileList();
 }
 
 bool BuildPciTablesFrom(PciIdsFileList files) {
   ReleasePciTables();
-  idsFiles = files;
+  *idsFiles = std::move(files);
   CountEntries();
   if (AllocateTables() && FillDevices() && FillClasses()) return true;
   ReleasePciTables();
@@ -403,7 +404,7 @@ void BuildPciTables() {
   PciIdsFileList files;
   for (const char *directory : kOverrideDirectories) files.AddDirectory(directory);
   files.AddPath(kPublishedFile);
-  BuildPciTablesFrom(files);
+  BuildPciTablesFrom(std::move(files));
 }
 
 PciClassCodeEntry LookupPciClass(uint16_t classCode) {

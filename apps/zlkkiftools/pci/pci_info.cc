@@ -8,6 +8,7 @@
 
 #include <utility>
 
+#include "base/io.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "records/pci.h"
@@ -153,17 +154,9 @@ bool GetPCIInfo(const Address &address, PciConfigHeader *header) {
 
 // Writes all `size` bytes to descriptor 1, past the buffer of standard output.
 bool WriteBytes(const uint8_t *bytes, size_t size) {
-  while (size > 0) {
-    const ssize_t written = write(STDOUT_FILENO, bytes, size);
-    if (written < 0 && errno == EINTR) continue;
-    if (written <= 0) {
-      if (errno != EPIPE) Warning("pci-info: write error: %s\n", strerror(errno));
-      return false;
-    }
-    bytes += written;
-    size -= static_cast<size_t>(written);
-  }
-  return true;
+  const int error = WriteAll(STDOUT_FILENO, bytes, size);
+  if (error != 0 && error != EPIPE) Warning("pci-info: write error: %s\n", strerror(error));
+  return error == 0;
 }
 
 // These give false only when the bytes were read but could not be written.

@@ -6,6 +6,8 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "base/array.h"
+#include "base/io.h"
 #include "kif/kif.h"
 #include "output.h"
 #include "records/platform.h"
@@ -16,16 +18,16 @@ namespace {
 // How often each signature came up, in the order in which they came up first.
 class SignatureCounter {
  public:
-  SignatureCounter() = default;
-  ~SignatureCounter() { free(entries_); }
-  SignatureCounter(const SignatureCounter &) = delete;
-  SignatureCounter &operator=(const SignatureCounter &) = delete;
-
   // Counts `signature` in; `*before` is how often it had come up before. False without memory.
   bool Count(const char (&signature)[kAcpiSignatureLength + 1], int *before) {
     size_t i = 0;
-    while (i < count_ && memcmp(entries_[i].signature, signature, sizeof(signature)) != 0) ++i;
-    if (i == count_ && !Append(signature)) return false;
+    while (i < entries_.size() && memcmp(entries_[i].signature, signature, sizeof(signature)) != 0)
+      ++i;
+    if (i == entries_.size()) {
+      Entry entry = {};
+      memcpy(entry.signature, signature, sizeof(signature));
+      if (!entries_.Append(entry)) return false;
+    }
     *before = entries_[i].count++;
     return true;
   }
@@ -36,18 +38,7 @@ class SignatureCounter {
     int count;
   };
 
-  bool Append(const char (&signature)[kAcpiSignatureLength + 1]) {
-    void *grown = realloc(entries_, (count_ + 1) * sizeof(Entry));
-    if (grown == nullptr) return false;
-    entries_ = static_cast<Entry *>(grown);
-    memcpy(entries_[count_].signature, signature, sizeof(signature));
-    entries_[count_].count = 0;
-    ++count_;
-    return true;
-  }
-
-  Entry *entries_ = nullptr;
-  size_t count_ = 0;
+  Array<Entry> entries_;
 };
 
 // A file to be written, or none.
@@ -64,14 +55,7 @@ class OutputFile {
   }
 
   bool Write(const uint8_t *bytes, size_t length) const {
-    while (length > 0) {
-      const ssize_t written = write(descriptor_, bytes, length);
-      if (written < 0 && errno == EINTR) continue;
-      if (written <= 0) return false;
-      bytes += written;
-      length -= static_cast<size_t>(written);
-    }
-    return true;
+    return WriteAll(descriptor_, bytes, length) == 0;
   }
 
   // False when the system could not keep what was written.

@@ -3,10 +3,10 @@
 #include <stdio.h>
 #include <string.h>
 
-#include "fsstats/volume_stats.h"
 #include "kif/kif.h"
 #include "kiftools.h"
 #include "output.h"
+#include "records/morelfs.h"
 #include "records/platform.h"
 #include "tools.h"
 
@@ -249,7 +249,7 @@ bool PrintModules(const Request &request) {
     const char *name = NameAt(archives.get(), i);
     if (name == nullptr) return false;
     TardiskStats stats = {};
-    if (ReadVolumeStats(KIF_NODE_system_morelfs_tardisks_stats, name, &stats) != 0) return false;
+    if (ReadRecordOf(KIF_NODE_system_morelfs_tardisks_stats, name, &stats) != 0) return false;
     if (static_cast<uint8_t>(stats.usedToBoot) != 0) printf("%s ", Shown(name).text());
   }
   putchar('\n');

@@ -40,7 +40,7 @@ void RegisterRoot(WorldRecord *record, UserspaceTable *table) {
 }
 
 bool BuildInventory(WorldInventory *inventory, UserspaceTable *table) {
-  const size_t count = inventory->worldCount + inventory->zombieCount;
+  const size_t count = inventory->worldCount + inventory->zombies.size();
   inventory->all.reset(static_cast<WorldRecord **>(calloc(count + 1, sizeof(void *))));
   if (inventory->all == nullptr) {
     fputs("WorldList: malloc failed when allocating allNodes list\n", stderr);
@@ -150,7 +150,7 @@ void PrintSummary(PsOptions options, uint32_t total, const WorldInventory &inven
   printf("Total worlds:         %u\n", total);
   printf("Total printed worlds: %zu\n", inventory.worldCount);
   if ((options & PS_TREE) != 0) printf("Deepest child:        %d\n", deepestLevel + 1);
-  if ((options & PS_ZOMBIES) != 0) printf("Zombie worlds:        %zu\n", inventory.zombieCount);
+  if ((options & PS_ZOMBIES) != 0) printf("Zombie worlds:        %zu\n", inventory.zombies.size());
   const auto filled = std::count_if(table.roots, table.roots + kUserspaces,
                                     [](const WorldRecord *root) { return root != nullptr; });
   printf("Total userspaces:     %d\n", static_cast<int>(filled));

@@ -55,19 +55,6 @@ Reading ReadSchedStats(KIF_ParamList *instance, SchedAffinity *affinity, WorldRe
   return Reading::kKept;
 }
 
-// Makes room for `more` zombie records, so that taking the next ones cannot fail.
-bool ReserveZombies(WorldInventory *inventory, size_t more) {
-  if (more <= inventory->zombieCapacity - inventory->zombieCount) return true;
-  size_t capacity = inventory->zombieCount + more;
-  if (capacity < inventory->zombieCapacity * 2) capacity = inventory->zombieCapacity * 2;
-  void *grown = realloc(inventory->zombies.get(), capacity * sizeof(WorldRecord));
-  if (grown == nullptr) return false;
-  (void)inventory->zombies.release();
-  inventory->zombies.reset(static_cast<WorldRecord *>(grown));
-  inventory->zombieCapacity = capacity;
-  return true;
-}
-
 bool FetchChildren(uint32_t cartelID, ParamListHandle *children) {
   const ParamListHandle parent = CreateInstance();
   if (parent == nullptr) {
@@ -106,14 +93,15 @@ bool ReadChild(uint32_t cartelID, int32_t childID, ChildRecord *child) {
   return status == 0;
 }
 
-void FillZombie(const WorldRecord &parent, int32_t childID, WorldRecord *zombie) {
-  *zombie = {};
-  zombie->worldID = zombie->cartelID = static_cast<uint32_t>(childID);
-  zombie->parentCartelID = static_cast<int32_t>(parent.cartelID);
-  zombie->processGroupID = parent.processGroupID;
-  zombie->sessionID = parent.sessionID;
-  zombie->userspaceID = parent.userspaceID;
-  zombie->isZombie = true;
+WorldRecord ZombieOf(const WorldRecord &parent, int32_t childID) {
+  WorldRecord zombie = {};
+  zombie.worldID = zombie.cartelID = static_cast<uint32_t>(childID);
+  zombie.parentCartelID = static_cast<int32_t>(parent.cartelID);
+  zombie.processGroupID = parent.processGroupID;
+  zombie.sessionID = parent.sessionID;
+  zombie.userspaceID = parent.userspaceID;
+  zombie.isZombie = true;
+  return zombie;
 }
 
 // Every world of a cartel looks at the cartel's children; its main world keeps the zombies.
@@ -121,11 +109,11 @@ bool CollectZombies(WorldInventory *inventory, WorldRecord *record) {
   ParamListHandle children;
   if (!FetchChildren(record->cartelID, &children)) return false;
   const int32_t count = children != nullptr ? KIF_ParamListUsedCount(children.get()) : 0;
-  if (count > 0 && !ReserveZombies(inventory, static_cast<size_t>(count))) {
+  if (count > 0 && !inventory->zombies.Reserve(static_cast<size_t>(count))) {
     fputs("failed to allocate array for zombies\n", stderr);
     return false;
   }
-  record->zombies = inventory->zombieCount;
+  record->zombies = inventory->zombies.size();
   for (int32_t i = 0; i < count; ++i) {
     int32_t childID;
     if (KIF_ParamListGetInt32(children.get(), static_cast<uint32_t>(i), &childID) != 0) {
@@ -135,7 +123,7 @@ bool CollectZombies(WorldInventory *inventory, WorldRecord *record) {
     ChildRecord child;
     if (!ReadChild(record->cartelID, childID, &child)) return false;
     if (child.childState != kChildStateZombie || record->worldID != record->cartelID) continue;
-    FillZombie(*record, childID, &inventory->zombies[inventory->zombieCount++]);
+    inventory->zombies.Append(ZombieOf(*record, childID));  // there is room
     ++record->zombieCount;
   }
   return true;
@@ -194,25 +182,14 @@ Reading ReadWorld(Reader *reader, InstanceWalk *walk, WorldRecord *record) {
 }  // namespace
 
 bool WorldTexts::Add(const char *text, size_t same, size_t *place) {
-  if (size_ > 0 && strcmp(text, At(same)) == 0) {
+  if (texts_.size() > 0 && strcmp(text, At(same)) == 0) {
     *place = same;
     return true;
   }
-  const size_t length = strlen(text) + 1;
-  const size_t start = size_ > 0 ? size_ : 1;
-  if (start + length > capacity_) {
-    const size_t capacity = (start + length) * 2 > 65536 ? (start + length) * 2 : 65536;
-    void *grown = realloc(texts_.get(), capacity);
-    if (grown == nullptr) return false;
-    (void)texts_.release();
-    texts_.reset(static_cast<char *>(grown));
-    texts_.get()[0] = '\0';
-    capacity_ = capacity;
-  }
-  memcpy(texts_.get() + start, text, length);
-  *place = start;
-  size_ = start + length;
-  return true;
+  // The empty text, and room for those of a small host at once.
+  if (texts_.size() == 0 && !(texts_.Reserve(65535) && texts_.Append("", 1))) return false;
+  *place = texts_.size();
+  return texts_.Append(text, strlen(text) + 1);
 }
 
 bool ReadWorlds(PsOptions options, WorldInventory *inventory, uint32_t *total) {

@@ -7,7 +7,9 @@
 
 #include <memory>
 
-#include "free_deleter.h"
+#include "base/array.h"
+#include "base/bytes.h"
+#include "base/free_deleter.h"
 
 struct WorldRecord {
   uint64_t usedTime;  // in microseconds
@@ -48,12 +50,10 @@ class WorldTexts {
   // worlds of one cartel share their command line, and nearly all worlds their CPUs. False
   // without memory.
   bool Add(const char *text, size_t same, size_t *place);
-  const char *At(size_t place) const { return size_ > 0 ? texts_.get() + place : ""; }
+  const char *At(size_t place) const { return texts_.text() + place; }
 
  private:
-  std::unique_ptr<char, FreeDeleter> texts_;
-  size_t size_ = 0;
-  size_t capacity_ = 0;
+  Bytes texts_;
 };
 
 // The records that are listed: those of the worlds that were kept, in the order of the host's list,
@@ -61,9 +61,7 @@ class WorldTexts {
 struct WorldInventory {
   std::unique_ptr<WorldRecord[], FreeDeleter> worlds;
   size_t worldCount = 0;
-  std::unique_ptr<WorldRecord[], FreeDeleter> zombies;
-  size_t zombieCount = 0;
-  size_t zombieCapacity = 0;
+  Array<WorldRecord> zombies;
   WorldTexts texts;
   std::unique_ptr<WorldRecord *[], FreeDeleter> all;
   size_t allCount = 0;

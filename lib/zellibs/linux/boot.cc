@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "base/io.h"
 #include "linux/files.h"
 #include "linux/kernel_release.h"
 #include "linux/linux_nodes.h"
@@ -201,14 +202,8 @@ KIF_Status ReadBootOptionFile(const NodeInfo &, const KIF_ParamList *instance, u
   struct stat facts;
   const KIF_Status status = OpenBootOptionFile(TextAt(instance, 0), &file, &facts);
   if (status != KIF_STATUS_OK) return status;
-  *given = 0;
-  while (*given < wanted) {
-    const ssize_t got = pread(file.fd(), static_cast<char *>(bytes) + *given, wanted - *given,
-                              static_cast<off_t>(offset) + *given);
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0) return StatusOfErrno(errno);
-    if (got == 0) break;
-    *given += static_cast<uint32_t>(got);
-  }
-  return KIF_STATUS_OK;
+  size_t read;
+  const int error = ReadAt(file.fd(), bytes, wanted, static_cast<off_t>(offset), &read);
+  *given = static_cast<uint32_t>(read);
+  return error == 0 ? KIF_STATUS_OK : StatusOfErrno(error);
 }

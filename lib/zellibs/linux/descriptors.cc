@@ -9,7 +9,7 @@
 #include <cstring>
 #include <iterator>
 
-#include "linux/everlasting.h"
+#include "base/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/process_directory.h"
@@ -26,16 +26,16 @@ struct KeptProcess {
   bool refused = false;      // the kernel refused a descriptor; it decides on processes as a whole
 };
 
-Everlasting<KeptProcess> kept;
+Everlasting<KeptProcess> snapshot;
 
 void Keep(int64_t process, int descriptors) {
-  kept->id = process;
-  kept->descriptors.Reset(descriptors);
-  kept->socketsRead = kept->refused = false;
+  snapshot->id = process;
+  snapshot->descriptors.Reset(descriptors);
+  snapshot->socketsRead = snapshot->refused = false;
 }
 
 KIF_Status KeepProcess(int64_t process) {
-  if (process == kept->id) return KIF_STATUS_OK;
+  if (process == snapshot->id) return KIF_STATUS_OK;
   int directory;
   Descriptor descriptors;
   KIF_Status status = OpenProcessDirectory(process, false, &directory);
@@ -91,16 +91,16 @@ const char *KindOf(const char *name, const char *target) {
   if (IsForeignRoot()) return KindOfRecordedPath(target);
   struct statx file;
   const int flags = AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT;
-  const bool known = statx(kept->descriptors.fd(), name, flags, STATX_TYPE, &file) == 0;
+  const bool known = statx(snapshot->descriptors.fd(), name, flags, STATX_TYPE, &file) == 0;
   return KindOfMode(known ? file.stx_mode : S_IFREG);
 }
 
 KIF_Status ReadSocketsOfKept() {
-  if (kept->socketsRead) return KIF_STATUS_OK;
+  if (snapshot->socketsRead) return KIF_STATUS_OK;
   int directory;
-  KIF_Status status = OpenProcessDirectory(kept->id, false, &directory);
+  KIF_Status status = OpenProcessDirectory(snapshot->id, false, &directory);
   if (status == KIF_STATUS_OK) status = ReadSocketsOf(directory);
-  kept->socketsRead = status == KIF_STATUS_OK;
+  snapshot->socketsRead = status == KIF_STATUS_OK;
   return status;
 }
 
@@ -115,17 +115,16 @@ KIF_Status NameSocket(char *text, size_t size, size_t *length) {
 }
 
 KIF_Status ReadLink(const char *name, char *text, size_t size, size_t *length) {
-  if (kept->refused) return KIF_STATUS_NO_PERMISSION;
-  const KIF_Status status = ReadLinkBelow(kept->descriptors.fd(), name, text, size, length);
-  kept->refused = status == KIF_STATUS_NO_PERMISSION;
+  if (snapshot->refused) return KIF_STATUS_NO_PERMISSION;
+  const KIF_Status status = ReadLinkBelow(snapshot->descriptors.fd(), name, text, size, length);
+  snapshot->refused = status == KIF_STATUS_NO_PERMISSION;
   return status;
 }
 
 }  // namespace
 
 KIF_Status ListDescriptors(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
-  int64_t process;
-  if (!IntegerAt(parent, 0, &process)) return KIF_STATUS_BAD_PARAMETER;
+  const int64_t process = Integer(parent, 0);
   int directory;
   DirectoryReader descriptors;
   KIF_Status status = OpenProcessDirectory(process, true, &directory);
@@ -147,12 +146,8 @@ KIF_Status ListDescriptors(const NodeInfo &, const KIF_ParamList *parent, KIF_Pa
 
 KIF_Status GetDescriptor(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   auto *descriptor = static_cast<DescriptorRecord *>(record);
-  int64_t process;
-  int64_t number;
-  if (!IntegerAt(instance, 0, &process) || !IntegerAt(instance, 1, &number)) {
-    return KIF_STATUS_BAD_PARAMETER;
-  }
-  KIF_Status status = KeepProcess(process);
+  const int64_t number = Integer(instance, 1);
+  KIF_Status status = KeepProcess(Integer(instance, 0));
   if (status != KIF_STATUS_OK) return status;
   char name[24];
   snprintf(name, sizeof(name), "%lld", static_cast<long long>(number));

@@ -9,8 +9,8 @@
 
 #include <cstring>
 
+#include "base/utf8.h"
 #include "host.h"
-#include "printable/printable.h"
 #include "status.h"
 
 namespace {
@@ -102,40 +102,9 @@ KIF_Status ReadLinkBelow(int directory, const char *path, char *buffer, size_t s
   return got >= 0 ? KIF_STATUS_OK : StatusOfErrno(errno);
 }
 
-bool Bytes::Reserve(size_t more) {
-  if (more >= SIZE_MAX / 2 - size_) return false;
-  const size_t wanted = size_ + more + 1;
-  if (wanted <= capacity_) return true;
-  const size_t grown = wanted > capacity_ * 2 ? wanted : capacity_ * 2;
-  void *data = realloc(data_, grown);
-  if (data == nullptr) return false;
-  data_ = static_cast<char *>(data);
-  capacity_ = grown;
-  data_[size_] = '\0';
-  return true;
-}
-
-bool Bytes::Append(const void *bytes, size_t size) {
-  if (!Reserve(size)) return false;
-  if (size > 0) memcpy(data_ + size_, bytes, size);
-  size_ += size;
-  data_[size_] = '\0';
-  return true;
-}
-
-KIF_Status Bytes::ReadAll(int file, size_t most) {
-  constexpr size_t kStep = 16384;
-  const size_t before = size_;
-  while (true) {
-    if (!Reserve(kStep)) return KIF_STATUS_NO_MEMORY;
-    const ssize_t got = read(file, data_ + size_, capacity_ - size_ - 1);
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0) return StatusOfErrno(errno);
-    size_ += static_cast<size_t>(got);
-    data_[size_] = '\0';
-    if (got == 0) return KIF_STATUS_OK;
-    if (size_ - before > most) return KIF_STATUS_TOO_LARGE;
-  }
+KIF_Status ReadWhole(const Descriptor &file, Bytes *bytes) {
+  const int error = bytes->ReadAll(file.fd());
+  return error == 0 ? KIF_STATUS_OK : StatusOfErrno(error);
 }
 
 KIF_Status DirectoryReader::Open(const char *path) {
@@ -168,21 +137,8 @@ const char *DirectoryReader::Next() {
 }
 
 void CopyText(char *field, size_t size, const char *text, size_t length) {
-  const size_t kept = printable::CutAtCharacter(text, length, size - 1);
+  const size_t kept = CutAtCharacter(text, length, size - 1);
   memcpy(field, text, kept);
-  printable::MaskControls(field, kept);
+  MaskControls(field, kept);
   field[kept] = '\0';
-}
-
-bool TakeNumber(const char **text, uint64_t *number) {
-  const char *digit = *text;
-  uint64_t value = 0;
-  for (; *digit >= '0' && *digit <= '9'; ++digit) {
-    const auto next = static_cast<uint64_t>(*digit - '0');
-    value = value > (UINT64_MAX - next) / 10 ? UINT64_MAX : value * 10 + next;
-  }
-  if (digit == *text) return false;
-  *text = digit;
-  *number = value;
-  return true;
 }

@@ -9,6 +9,8 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "base/bytes.h"
+#include "base/number.h"
 #include "zellibs.h"
 
 // An open file descriptor, closed with its owner. -1: none.
@@ -38,38 +40,8 @@ class Descriptor {
   int fd_;
 };
 
-// A growing run of bytes, always followed by a NUL that does not count.
-class Bytes {
- public:
-  Bytes() = default;
-  ~Bytes() { free(data_); }
-  Bytes(const Bytes &) = delete;
-  Bytes &operator=(const Bytes &) = delete;
-
-  // Makes room for `more` bytes behind the present ones. False without memory.
-  bool Reserve(size_t more);
-  bool Append(const void *bytes, size_t size);
-  void Clear() { size_ = 0; }
-
-  // Forgets the bytes behind the first `size`, of which there are that many.
-  void Truncate(size_t size) {
-    size_ = size;
-    if (data_ != nullptr) data_[size] = '\0';
-  }
-
-  char *data() { return data_; }
-  const char *text() const { return data_ != nullptr ? data_ : ""; }
-  size_t size() const { return size_; }
-
-  // Reads `file` from its present place to its end behind the present bytes; more than `most`
-  // bytes are KIF_STATUS_TOO_LARGE.
-  KIF_Status ReadAll(int file, size_t most = size_t{64} << 20);
-
- private:
-  char *data_ = nullptr;
-  size_t size_ = 0;
-  size_t capacity_ = 0;
-};
+// As Bytes::ReadAll, with a status.
+KIF_Status ReadWhole(const Descriptor &file, Bytes *bytes);
 
 // True where the host is a tree of files taken from elsewhere, and system calls about processes
 // or devices do not speak of it.
@@ -121,7 +93,3 @@ class DirectoryReader {
 // Copies a text of the machine into a field of `size` bytes: printable, cut at a character's end,
 // terminated.
 void CopyText(char *field, size_t size, const char *text, size_t length);
-
-// Converts the decimal number that `text` begins with and moves `*text` behind it; false where
-// there is none. Numbers beyond 64 bits become the largest one.
-bool TakeNumber(const char **text, uint64_t *number);

@@ -4,8 +4,8 @@
 #include <cstddef>
 #include <cstring>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "records/platform.h"
@@ -29,7 +29,7 @@ struct Interrupts {
   const char *nextCount = nullptr;  // null: none was read yet
 };
 
-Everlasting<Interrupts> interrupts;
+Everlasting<Interrupts> snapshot;
 
 const char *SkipBlanks(const char *text) {
   while (*text == ' ') ++text;
@@ -53,59 +53,58 @@ const char *NextLine(const char *line) {
 // The first line names the columns, one for each CPU online; rows without a number are those of
 // the processor itself.
 KIF_Status FindRows(const char *line) {
-  interrupts->cpus = CountWords(line);
+  snapshot->cpus = CountWords(line);
   for (line = NextLine(line); *line != '\0'; line = NextLine(line)) {
     const char *place = SkipBlanks(line);
     uint64_t number;
     if (!TakeNumber(&place, &number) || *place != ':') continue;
-    if (!interrupts->rows.Append({number, place + 1})) return KIF_STATUS_NO_MEMORY;
+    if (!snapshot->rows.Append({number, place + 1})) return KIF_STATUS_NO_MEMORY;
   }
   return KIF_STATUS_OK;
 }
 
 KIF_Status ReadInterrupts() {
-  interrupts->read = false;
-  interrupts->text.Clear();
-  interrupts->rows.Clear();
-  interrupts->lastRow = 0;
-  interrupts->nextCount = nullptr;
+  snapshot->read = false;
+  snapshot->text.Clear();
+  snapshot->rows.Clear();
+  snapshot->lastRow = 0;
+  snapshot->nextCount = nullptr;
   Descriptor file;
   KIF_Status status = OpenHostFile("/proc/interrupts", O_RDONLY, &file);
-  if (status == KIF_STATUS_OK) status = interrupts->text.ReadAll(file.fd());
-  if (status == KIF_STATUS_OK) status = FindRows(interrupts->text.text());
-  interrupts->read = status == KIF_STATUS_OK;
+  if (status == KIF_STATUS_OK) status = ReadWhole(file, &snapshot->text);
+  if (status == KIF_STATUS_OK) status = FindRows(snapshot->text.text());
+  snapshot->read = status == KIF_STATUS_OK;
   return status;
 }
 
 // Finds the row that `list` selects. Rows are read in their order, many times each, so the search
 // begins at the last one.
 KIF_Status FindRow(const KIF_ParamList *list, size_t *row) {
-  const KIF_Status status = interrupts->read ? KIF_STATUS_OK : ReadInterrupts();
+  const KIF_Status status = snapshot->read ? KIF_STATUS_OK : ReadInterrupts();
   if (status != KIF_STATUS_OK) return status;
-  int64_t number;
-  if (!IntegerAt(list, 0, &number)) return KIF_STATUS_BAD_PARAMETER;
-  const size_t count = interrupts->rows.size();
+  const auto number = static_cast<uint64_t>(Integer(list, 0));
+  const size_t count = snapshot->rows.size();
   for (size_t i = 0; i < count; ++i) {
-    *row = (interrupts->lastRow + i) % count;
-    if (interrupts->rows[*row].number == static_cast<uint64_t>(number)) return KIF_STATUS_OK;
+    *row = (snapshot->lastRow + i) % count;
+    if (snapshot->rows[*row].number == number) return KIF_STATUS_OK;
   }
   return KIF_STATUS_NOT_FOUND;
 }
 
 // Moves behind the count of `cpu` in a row, and gives it. False where the row has no such column.
 bool TakeCount(size_t row, size_t cpu, const char **behind, uint64_t *count) {
-  if (cpu >= interrupts->cpus) return false;
+  if (cpu >= snapshot->cpus) return false;
   const bool goesOn =
-      interrupts->nextCount != nullptr && row == interrupts->lastRow && cpu >= interrupts->nextCpu;
-  size_t column = goesOn ? interrupts->nextCpu : 0;
-  const char *place = goesOn ? interrupts->nextCount : interrupts->rows[row].counts;
+      snapshot->nextCount != nullptr && row == snapshot->lastRow && cpu >= snapshot->nextCpu;
+  size_t column = goesOn ? snapshot->nextCpu : 0;
+  const char *place = goesOn ? snapshot->nextCount : snapshot->rows[row].counts;
   for (; column <= cpu; ++column) {
     place = SkipBlanks(place);
     if (!TakeNumber(&place, count)) return false;
   }
-  interrupts->lastRow = row;
-  interrupts->nextCpu = column;
-  interrupts->nextCount = place;
+  snapshot->lastRow = row;
+  snapshot->nextCpu = column;
+  snapshot->nextCount = place;
   *behind = place;
   return true;
 }
@@ -126,10 +125,10 @@ bool IsSource(const char *text, size_t length) {
 // The devices that use an interrupt, "i801_smbus, ahci", stand at the row's end, two blanks behind
 // the controller and its number. Both of these may have such gaps too.
 const char *FindDevices(size_t row, size_t *length) {
-  const char *start = interrupts->rows[row].counts;
+  const char *start = snapshot->rows[row].counts;
   uint64_t count;
   *length = 0;
-  if (interrupts->cpus > 0 && !TakeCount(row, interrupts->cpus - 1, &start, &count)) return start;
+  if (snapshot->cpus > 0 && !TakeCount(row, snapshot->cpus - 1, &start, &count)) return start;
   start = SkipBlanks(start);
   const char *end = start + strcspn(start, "\n");
   while (end > start && end[-1] == ' ') --end;
@@ -152,8 +151,8 @@ KIF_Status AddDevice(const char *name, size_t length, KIF_ParamList *list) {
 
 KIF_Status ListInterrupts(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
   KIF_Status status = ReadInterrupts();
-  for (size_t i = 0; status == KIF_STATUS_OK && i < interrupts->rows.size(); ++i) {
-    status = KIF_ParamListAddInt(list, static_cast<int64_t>(interrupts->rows[i].number));
+  for (size_t i = 0; status == KIF_STATUS_OK && i < snapshot->rows.size(); ++i) {
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(snapshot->rows[i].number));
   }
   return status;
 }
@@ -171,11 +170,10 @@ KIF_Status GetInterruptCount(const NodeInfo &, const KIF_ParamList *instance, vo
   size_t row;
   const KIF_Status status = FindRow(instance, &row);
   if (status != KIF_STATUS_OK) return status;
-  int64_t cpu;
+  const int64_t cpu = Integer(instance, 1);
   uint64_t count;
   const char *behind;
-  if (!IntegerAt(instance, 1, &cpu) || cpu < 0 ||
-      !TakeCount(row, static_cast<size_t>(cpu), &behind, &count)) {
+  if (cpu < 0 || !TakeCount(row, static_cast<size_t>(cpu), &behind, &count)) {
     return KIF_STATUS_NOT_FOUND;
   }
   static_cast<PcpuCount *>(record)->count = count;

@@ -7,6 +7,11 @@
 #include "param_list.h"
 #include "status.h"
 
+// The integer at `index` of a list that has been checked.
+inline int64_t Integer(const KIF_ParamList *list, uint32_t index) {
+  return list->params[index].integer;
+}
+
 using RecordMethod = KIF_Status (*)(const NodeInfo &node, const KIF_ParamList *instance,
                                     void *record);
 using InstancesMethod = KIF_Status (*)(const NodeInfo &node, const KIF_ParamList *parent,

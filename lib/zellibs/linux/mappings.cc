@@ -6,7 +6,8 @@
 #include <cstring>
 #include <initializer_list>
 
-#include "linux/everlasting.h"
+#include "base/everlasting.h"
+#include "base/hex.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/process_directory.h"
@@ -32,7 +33,7 @@ struct KeptMaps {
   size_t next = 0;  // place of the line behind the one that was asked for last
 };
 
-Everlasting<KeptMaps> kept;
+Everlasting<KeptMaps> snapshot;
 
 // The directory that is open may be that of a process that had the same number.
 KIF_Status OpenMaps(int64_t process, Descriptor *file) {
@@ -47,19 +48,14 @@ KIF_Status OpenMaps(int64_t process, Descriptor *file) {
 }
 
 KIF_Status ReadMaps(int64_t process) {
-  kept->process = -1;
-  kept->text.Clear();
-  kept->next = 0;
+  snapshot->process = -1;
+  snapshot->text.Clear();
+  snapshot->next = 0;
   Descriptor file;
   KIF_Status status = OpenMaps(process, &file);
-  if (status == KIF_STATUS_OK) status = kept->text.ReadAll(file.fd());
-  if (status == KIF_STATUS_OK) kept->process = process;
+  if (status == KIF_STATUS_OK) status = ReadWhole(file, &snapshot->text);
+  if (status == KIF_STATUS_OK) snapshot->process = process;
   return status;
-}
-
-int HexadecimalDigit(char digit) {
-  if (digit >= '0' && digit <= '9') return digit - '0';
-  return digit >= 'a' && digit <= 'f' ? digit - 'a' + 10 : -1;
 }
 
 // An address, and the character `end` behind it.
@@ -67,7 +63,7 @@ bool TakeAddress(const char **text, char end, uint64_t *address) {
   constexpr int kMostDigits = 16;
   const char *place = *text;
   *address = 0;
-  for (int digit; (digit = HexadecimalDigit(*place)) >= 0; ++place) {
+  for (int digit; (digit = HexDigit(*place)) >= 0; ++place) {
     *address = *address << 4 | static_cast<uint64_t>(digit);
   }
   if (place == *text || place - *text > kMostDigits || *place != end) return false;
@@ -97,11 +93,11 @@ bool ParseLine(const char *line, size_t length, Mapping *mapping) {
 // Takes the mapping at or behind `*place` in the text and moves `*place` behind its line. False at
 // the end.
 bool NextMapping(size_t *place, Mapping *mapping) {
-  const char *text = kept->text.text();
+  const char *text = snapshot->text.text();
   bool found = false;
-  while (!found && *place < kept->text.size()) {
+  while (!found && *place < snapshot->text.size()) {
     const char *line = text + *place;
-    const size_t rest = kept->text.size() - *place;
+    const size_t rest = snapshot->text.size() - *place;
     const void *newline = memchr(line, '\n', rest);
     const size_t length =
         newline != nullptr ? static_cast<size_t>(static_cast<const char *>(newline) - line) : rest;
@@ -113,22 +109,20 @@ bool NextMapping(size_t *place, Mapping *mapping) {
 
 // Mappings are asked for in the order of their list, mostly.
 bool FindMapping(uint64_t start, Mapping *mapping) {
-  const size_t first = kept->next;
+  const size_t first = snapshot->next;
   size_t place = first;
   bool found = false;
   while (!found && NextMapping(&place, mapping)) found = mapping->start == start;
   if (!found) place = 0;
   while (!found && place < first && NextMapping(&place, mapping)) found = mapping->start == start;
-  kept->next = place;
+  snapshot->next = place;
   return found;
 }
 
 }  // namespace
 
 KIF_Status ListMappings(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
-  int64_t process;
-  if (!IntegerAt(parent, 0, &process)) return KIF_STATUS_BAD_PARAMETER;
-  KIF_Status status = ReadMaps(process);
+  KIF_Status status = ReadMaps(Integer(parent, 0));
   Mapping mapping;
   size_t place = 0;
   while (status == KIF_STATUS_OK && NextMapping(&place, &mapping)) {
@@ -139,15 +133,12 @@ KIF_Status ListMappings(const NodeInfo &, const KIF_ParamList *parent, KIF_Param
 
 KIF_Status GetMapping(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   auto *filled = static_cast<MappingRecord *>(record);
-  int64_t process;
-  int64_t start;
-  if (!IntegerAt(instance, 0, &process) || !IntegerAt(instance, 1, &start)) {
-    return KIF_STATUS_BAD_PARAMETER;
-  }
-  const KIF_Status status = process == kept->process ? KIF_STATUS_OK : ReadMaps(process);
+  const int64_t process = Integer(instance, 0);
+  const KIF_Status status = process == snapshot->process ? KIF_STATUS_OK : ReadMaps(process);
   if (status != KIF_STATUS_OK) return status;
   Mapping mapping;
-  if (!FindMapping(static_cast<uint64_t>(start), &mapping)) return KIF_STATUS_NOT_FOUND;
+  if (!FindMapping(static_cast<uint64_t>(Integer(instance, 1)), &mapping))
+    return KIF_STATUS_NOT_FOUND;
   const uint64_t length = mapping.end - mapping.start;
   filled->length = length < UINT32_MAX ? static_cast<uint32_t>(length) : UINT32_MAX;
   filled->kind = mapping.hasFile ? kMappingOfFile : kOther;

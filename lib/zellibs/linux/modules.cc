@@ -8,8 +8,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "records/pci.h"
@@ -33,12 +33,12 @@ struct ModuleTable {
   Array<Driver> drivers;  // of functions, each once
 };
 
-Everlasting<ModuleTable> table;
+Everlasting<ModuleTable> snapshot;
 
 KIF_Status AddModule(const char *name, size_t length) {
   Module module = {};
   CopyText(module.name, sizeof(module.name), name, length);
-  return table->modules.Append(module) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+  return snapshot->modules.Append(module) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
 // proc(5), /proc/modules: a line each, which begins with the name.
@@ -46,7 +46,7 @@ KIF_Status AddLoadedModules() {
   Descriptor file;
   Bytes lines;
   KIF_Status status = OpenHostFile("/proc/modules", O_RDONLY, &file);
-  if (status == KIF_STATUS_OK) status = lines.ReadAll(file.fd());
+  if (status == KIF_STATUS_OK) status = ReadWhole(file, &lines);
   const char *line = lines.text();
   while (status == KIF_STATUS_OK && *line != '\0') {
     const size_t name = strcspn(line, " \n");
@@ -54,14 +54,14 @@ KIF_Status AddLoadedModules() {
     line += strcspn(line, "\n");
     if (*line == '\n') ++line;
   }
-  table->loaded = table->modules.size();
+  snapshot->loaded = snapshot->modules.size();
   return status;
 }
 
 // Place of a loaded module plus 1, or 0. Drivers write '-' where modules have '_'.
 uint32_t FindLoaded(const char *name) {
-  for (uint32_t i = 0; i < table->loaded; ++i) {
-    const char *module = table->modules[i].name;
+  for (uint32_t i = 0; i < snapshot->loaded; ++i) {
+    const char *module = snapshot->modules[i].name;
     size_t k = 0;
     while (name[k] != '\0' && (name[k] == module[k] || (name[k] == '-' && module[k] == '_'))) ++k;
     if (name[k] == module[k]) return i + 1;
@@ -70,8 +70,8 @@ uint32_t FindLoaded(const char *name) {
 }
 
 uint32_t FindBuiltIn(const char *name) {
-  for (size_t i = table->loaded; i < table->modules.size(); ++i) {
-    if (strcmp(table->modules[i].name, name) == 0) return static_cast<uint32_t>(i + 1);
+  for (size_t i = snapshot->loaded; i < snapshot->modules.size(); ++i) {
+    if (strcmp(snapshot->modules[i].name, name) == 0) return static_cast<uint32_t>(i + 1);
   }
   return 0;
 }
@@ -83,7 +83,7 @@ uint32_t FindInTable(const Driver &driver) {
 }
 
 const Driver *FindDriver(const char *name) {
-  for (const Driver &driver : table->drivers) {
+  for (const Driver &driver : snapshot->drivers) {
     if (strcmp(driver.name, name) == 0) return &driver;
   }
   return nullptr;
@@ -103,7 +103,7 @@ KIF_Status AddDriver(int devices, const char *address) {
   if (driver.name[0] == '\0' || FindDriver(driver.name) != nullptr) return KIF_STATUS_OK;
   snprintf(path, sizeof(path), "%s/driver/module", address);
   CopyLinkName(devices, path, driver.module, sizeof(driver.module));
-  if (!table->drivers.Append(driver)) return KIF_STATUS_NO_MEMORY;
+  if (!snapshot->drivers.Append(driver)) return KIF_STATUS_NO_MEMORY;
   return FindInTable(driver) != 0 ? KIF_STATUS_OK : AddModule(driver.name, strlen(driver.name));
 }
 
@@ -116,29 +116,29 @@ KIF_Status AddDrivers() {
     status = AddDriver(devices.fd(), address);
   }
   if (status == KIF_STATUS_OK) status = devices.status();
-  const size_t builtIn = table->modules.size() - table->loaded;
+  const size_t builtIn = snapshot->modules.size() - snapshot->loaded;
   if (builtIn > 0) {
-    qsort(table->modules.begin() + table->loaded, builtIn, sizeof(Module), CompareModules);
+    qsort(snapshot->modules.begin() + snapshot->loaded, builtIn, sizeof(Module), CompareModules);
   }
   return status;
 }
 
 // A kernel may do without modules or without a PCI bus, but where neither is seen there is no list.
 KIF_Status ReadModules() {
-  table->read = false;
-  table->modules.Clear();
-  table->drivers.Clear();
-  table->loaded = 0;
+  snapshot->read = false;
+  snapshot->modules.Clear();
+  snapshot->drivers.Clear();
+  snapshot->loaded = 0;
   KIF_Status status = AddLoadedModules();
   const bool hasModules = status == KIF_STATUS_OK;
   if (status == KIF_STATUS_OK || status == KIF_STATUS_NOT_FOUND) status = AddDrivers();
   if (status == KIF_STATUS_NOT_FOUND && hasModules) status = KIF_STATUS_OK;
-  table->read = status == KIF_STATUS_OK;
+  snapshot->read = status == KIF_STATUS_OK;
   return status;
 }
 
 KIF_Status NeedModules() {
-  return table->read ? KIF_STATUS_OK : ReadModules();
+  return snapshot->read ? KIF_STATUS_OK : ReadModules();
 }
 
 }  // namespace
@@ -165,7 +165,7 @@ KIF_Status FindModule(const char *name, uint32_t *number) {
 
 KIF_Status ListModuleNumbers(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
   KIF_Status status = ReadModules();
-  for (uint32_t i = 0; status == KIF_STATUS_OK && i < table->modules.size(); ++i) {
+  for (uint32_t i = 0; status == KIF_STATUS_OK && i < snapshot->modules.size(); ++i) {
     status = KIF_ParamListAddInt(list, i + 1);
   }
   return status;
@@ -174,13 +174,12 @@ KIF_Status ListModuleNumbers(const NodeInfo &, const KIF_ParamList *, KIF_ParamL
 KIF_Status GetModule(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const KIF_Status status = NeedModules();
   if (status != KIF_STATUS_OK) return status;
-  int64_t number;
-  if (!IntegerAt(instance, 0, &number) || number < 1 ||
-      static_cast<uint64_t>(number) > table->modules.size()) {
+  const int64_t number = Integer(instance, 0);
+  if (number < 1 || static_cast<uint64_t>(number) > snapshot->modules.size()) {
     return KIF_STATUS_NOT_FOUND;
   }
   auto *module = static_cast<ModuleRecord *>(record);
-  const Module &known = table->modules[static_cast<size_t>(number) - 1];
+  const Module &known = snapshot->modules[static_cast<size_t>(number) - 1];
   memcpy(module->name, known.name, sizeof(known.name));
   module->moduleID = static_cast<uint32_t>(number);
   return KIF_STATUS_OK;

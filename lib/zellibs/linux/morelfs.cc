@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "linux/everlasting.h"
+#include "base/everlasting.h"
 #include "linux/linux_nodes.h"
 #include "linux/volumes.h"
 #include "records/morelfs.h"
@@ -17,7 +17,7 @@ namespace {
 constexpr const char *kArchiveTypes[] = {"squashfs", "erofs", "cramfs", "iso9660"};
 constexpr const char *kMemoryTypes[] = {"tmpfs", "ramfs", "rootfs"};
 
-Everlasting<VolumeTable> known;
+Everlasting<VolumeTable> snapshot;
 
 template <size_t Count>
 bool IsOneOf(const char *text, const char *const (&texts)[Count]) {
@@ -44,19 +44,19 @@ bool IsPart(const MountTable &mounts, const Mount &mount) {
 }
 
 KIF_Status ReadVolumes() {
-  known->read = false;
-  known->volumes.Clear();
-  const KIF_Status status = ReadMounts(&known->mounts);
+  snapshot->read = false;
+  snapshot->volumes.Clear();
+  const KIF_Status status = ReadMounts(&snapshot->mounts);
   if (status != KIF_STATUS_OK) return status;
-  for (const Mount &mount : known->mounts.mounts) {
+  for (const Mount &mount : snapshot->mounts.mounts) {
     const bool isTardisk = IsOneOf(mount.type, kArchiveTypes);
     if (!isTardisk && !IsOneOf(mount.type, kMemoryTypes)) continue;
-    if (mount.hidden || IsPart(known->mounts, mount)) continue;
+    if (mount.hidden || IsPart(snapshot->mounts, mount)) continue;
     Volume volume = {&mount, isTardisk, ""};
     CopyText(volume.name, sizeof(volume.name), mount.point, strlen(mount.point));
-    if (!known->volumes.Append(volume)) return KIF_STATUS_NO_MEMORY;
+    if (!snapshot->volumes.Append(volume)) return KIF_STATUS_NO_MEMORY;
   }
-  known->read = true;
+  snapshot->read = true;
   return KIF_STATUS_OK;
 }
 
@@ -131,7 +131,7 @@ bool IsLayer(const char *layers, const char *point) {
 bool IsUsedToBoot(const Volume &volume) {
   const char *point = volume.mount->point;
   if (strcmp(point, "/") == 0) return true;
-  for (const Mount &root : known->mounts.mounts) {
+  for (const Mount &root : snapshot->mounts.mounts) {
     if (root.hidden || strcmp(root.point, "/") != 0 || strcmp(root.type, "overlay") != 0) continue;
     for (const char *option = root.options; option != nullptr; option = strchr(option, ',')) {
       if (*option == ',') ++option;
@@ -148,8 +148,8 @@ bool IsUsedToBoot(const Volume &volume) {
 }  // namespace
 
 KIF_Status NeedVolumes(bool refresh, const VolumeTable **table) {
-  *table = &*known;
-  return known->read && !refresh ? KIF_STATUS_OK : ReadVolumes();
+  *table = &*snapshot;
+  return snapshot->read && !refresh ? KIF_STATUS_OK : ReadVolumes();
 }
 
 KIF_Status OpenVolume(const Volume &volume, Descriptor *folder) {

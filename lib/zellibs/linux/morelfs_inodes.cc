@@ -9,8 +9,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
 #include "linux/linux_nodes.h"
 #include "linux/volumes.h"
 #include "records/morelfs.h"
@@ -42,7 +42,7 @@ struct InodeTable {
   Array<VolumeName> volumes;
 };
 
-Everlasting<InodeTable> table;
+Everlasting<InodeTable> snapshot;
 
 // A walk under way.
 struct Walk {
@@ -64,9 +64,9 @@ KIF_Status AddInode(uint32_t volume, const struct stat &facts, const char *path,
                        volume,
                        size < UINT32_MAX ? static_cast<uint32_t>(size) : UINT32_MAX,
                        deleted,
-                       table->paths.size()};
+                       snapshot->paths.size()};
   const bool added =
-      table->inodes.Append(inode) && table->paths.Append(printed, strlen(printed) + 1);
+      snapshot->inodes.Append(inode) && snapshot->paths.Append(printed, strlen(printed) + 1);
   return added ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
@@ -261,16 +261,16 @@ KIF_Status KeepVolumeNames(const VolumeTable &volumes) {
   for (const Volume &volume : volumes.volumes) {
     VolumeName name = {volume.isTardisk, ""};
     memcpy(name.name, volume.name, sizeof(name.name));
-    if (!table->volumes.Append(name)) return KIF_STATUS_NO_MEMORY;
+    if (!snapshot->volumes.Append(name)) return KIF_STATUS_NO_MEMORY;
   }
   return KIF_STATUS_OK;
 }
 
 KIF_Status ReadInodes() {
-  table->read = false;
-  table->inodes.Clear();
-  table->paths.Clear();
-  table->volumes.Clear();
+  snapshot->read = false;
+  snapshot->inodes.Clear();
+  snapshot->paths.Clear();
+  snapshot->volumes.Clear();
   if (IsForeignRoot()) return KIF_STATUS_NOT_FOUND;
   Walk walk;
   KIF_Status status = NeedVolumes(true, &walk.volumes);
@@ -281,8 +281,8 @@ KIF_Status ReadInodes() {
   }
   if (status == KIF_STATUS_OK) status = WalkProcesses(*walk.volumes);
   if (status != KIF_STATUS_OK) return status;
-  NumberInodes(&table->inodes);
-  table->read = true;
+  NumberInodes(&snapshot->inodes);
+  snapshot->read = true;
   return KIF_STATUS_OK;
 }
 
@@ -290,28 +290,27 @@ KIF_Status ReadInodes() {
 
 KIF_Status ListInodes(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
   KIF_Status status = ReadInodes();
-  for (size_t i = 0; status == KIF_STATUS_OK && i < table->inodes.size(); ++i) {
-    status = KIF_ParamListAddInt(list, static_cast<int64_t>(table->inodes[i].number));
+  for (size_t i = 0; status == KIF_STATUS_OK && i < snapshot->inodes.size(); ++i) {
+    status = KIF_ParamListAddInt(list, static_cast<int64_t>(snapshot->inodes[i].number));
   }
   return status;
 }
 
 KIF_Status GetInode(const NodeInfo &, const KIF_ParamList *instance, void *record) {
-  const KIF_Status status = table->read ? KIF_STATUS_OK : ReadInodes();
+  const KIF_Status status = snapshot->read ? KIF_STATUS_OK : ReadInodes();
   if (status != KIF_STATUS_OK) return status;
-  int64_t number;
-  if (table->inodes.size() == 0 || !IntegerAt(instance, 0, &number)) return KIF_STATUS_NOT_FOUND;
+  if (snapshot->inodes.size() == 0) return KIF_STATUS_NOT_FOUND;
   Inode wanted = {};
-  wanted.number = static_cast<uint64_t>(number);
-  const auto *inode = static_cast<const Inode *>(
-      bsearch(&wanted, table->inodes.begin(), table->inodes.size(), sizeof(Inode), CompareNumbers));
+  wanted.number = static_cast<uint64_t>(Integer(instance, 0));
+  const auto *inode = static_cast<const Inode *>(bsearch(
+      &wanted, snapshot->inodes.begin(), snapshot->inodes.size(), sizeof(Inode), CompareNumbers));
   if (inode == nullptr) return KIF_STATUS_NOT_FOUND;
-  const VolumeName &volume = table->volumes[inode->volume];
+  const VolumeName &volume = snapshot->volumes[inode->volume];
   auto *stats = static_cast<InodeStats *>(record);
   stats->flags = volume.isTardisk ? kInodeOnTardisk : InodeFlags{};
   stats->linkState = inode->deleted ? kInodeUnlinked : 0;
   stats->size = inode->size;
   memcpy(volume.isTardisk ? stats->tardisk : stats->ramdisk, volume.name, sizeof(volume.name));
-  snprintf(stats->name, sizeof(stats->name), "%s", table->paths.text() + inode->path);
+  snprintf(stats->name, sizeof(stats->name), "%s", snapshot->paths.text() + inode->path);
   return KIF_STATUS_OK;
 }

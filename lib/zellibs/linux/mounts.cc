@@ -172,7 +172,7 @@ KIF_Status ReadMounts(MountTable *table) {
   table->text.Clear();
   Descriptor file;
   KIF_Status status = OpenHostFile("/proc/self/mountinfo", O_RDONLY, &file);
-  if (status == KIF_STATUS_OK) status = table->text.ReadAll(file.fd());
+  if (status == KIF_STATUS_OK) status = ReadWhole(file, &table->text);
   if (status == KIF_STATUS_OK) status = ParseLines(table->text.data(), table);
   if (status != KIF_STATUS_OK || table->mounts.size() == 0) return status;
   qsort(table->mounts.begin(), table->mounts.size(), sizeof(Mount), CompareMounts);

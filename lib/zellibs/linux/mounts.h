@@ -4,7 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "linux/array.h"
+#include "base/array.h"
 #include "linux/files.h"
 
 struct Mount {

@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "base/io.h"
 #include "linux/driver_product.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
@@ -220,24 +221,10 @@ uint8_t MemberFlags(int function, uint16_t classCode, const char *driver) {
   return flags;
 }
 
-// Reads up to `size` bytes of a configuration space; `*given` is how many there are to be seen.
-KIF_Status ReadConfig(int config, size_t offset, void *bytes, size_t size, size_t *given) {
-  *given = 0;
-  while (*given < size) {
-    const ssize_t got = pread(config, static_cast<char *>(bytes) + *given, size - *given,
-                              static_cast<off_t>(offset + *given));
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0) return StatusOfErrno(errno);
-    if (got == 0) break;
-    *given += static_cast<size_t>(got);
-  }
-  return KIF_STATUS_OK;
-}
-
 bool ReadConfigPart(int config, size_t offset, size_t size, ConfigSpace *space) {
   size_t given;
-  return ReadConfig(config, offset, reinterpret_cast<char *>(space) + offset, size, &given) ==
-             KIF_STATUS_OK &&
+  return ReadAt(config, reinterpret_cast<char *>(space) + offset, size, static_cast<off_t>(offset),
+                &given) == 0 &&
          given == size;
 }
 
@@ -316,7 +303,8 @@ KIF_Status GetPciConfigSpace(const NodeInfo &node, const KIF_ParamList *instance
   const uint32_t size = node.offers.recordSize;
   if (facts.st_size == kWithoutExtension && size > kWithoutExtension) return KIF_STATUS_NOT_FOUND;
   size_t given;
-  status = ReadConfig(file.fd(), 0, record, size, &given);
-  if (status != KIF_STATUS_OK || given == size) return status;
+  const int error = ReadAt(file.fd(), record, size, 0, &given);
+  if (error != 0) return StatusOfErrno(error);
+  if (given == size) return KIF_STATUS_OK;
   return given < kWithoutExtension ? KIF_STATUS_NO_PERMISSION : KIF_STATUS_NOT_FOUND;
 }

@@ -6,8 +6,9 @@
 #include <cstdio>
 #include <cstring>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
+#include "base/hex.h"
 #include "linux/linux_nodes.h"
 
 namespace {
@@ -31,7 +32,7 @@ struct Bus {
   Array<PhysicalSlot> slots;
 };
 
-Everlasting<Bus> bus;
+Everlasting<Bus> snapshot;
 
 // "0000:00:1f.2". Segments beyond four digits are those of virtual buses.
 bool ParseAddress(const char *text, PciAddress *address) {
@@ -49,17 +50,18 @@ int CompareAddresses(const void *left, const void *right) {
 }
 
 KIF_Status ReadFunctions() {
-  bus->functions.Clear();
+  snapshot->functions.Clear();
   DirectoryReader reader;
   const KIF_Status status = reader.Open(kDevices);
   if (status != KIF_STATUS_OK) return status;
   while (const char *name = reader.Next()) {
     PciAddress address;
     const bool isFunction = ParseAddress(name, &address);
-    if (isFunction && !bus->functions.Append(address)) return KIF_STATUS_NO_MEMORY;
+    if (isFunction && !snapshot->functions.Append(address)) return KIF_STATUS_NO_MEMORY;
   }
-  if (bus->functions.size() > 0) {
-    qsort(bus->functions.begin(), bus->functions.size(), sizeof(PciAddress), CompareAddresses);
+  if (snapshot->functions.size() > 0) {
+    qsort(snapshot->functions.begin(), snapshot->functions.size(), sizeof(PciAddress),
+          CompareAddresses);
   }
   return reader.status();
 }
@@ -84,27 +86,27 @@ bool ReadSlot(int slots, const char *name, PhysicalSlot *slot) {
 }
 
 KIF_Status ReadSlots() {
-  bus->slots.Clear();
+  snapshot->slots.Clear();
   DirectoryReader reader;
   if (reader.Open(kSlots) != KIF_STATUS_OK) return KIF_STATUS_OK;
   while (const char *name = reader.Next()) {
     PhysicalSlot slot;
     const bool isSlot = ReadSlot(reader.fd(), name, &slot);
-    if (isSlot && !bus->slots.Append(slot)) return KIF_STATUS_NO_MEMORY;
+    if (isSlot && !snapshot->slots.Append(slot)) return KIF_STATUS_NO_MEMORY;
   }
   return KIF_STATUS_OK;
 }
 
 KIF_Status ReadBus() {
-  bus->read = false;
+  snapshot->read = false;
   KIF_Status status = ReadFunctions();
   if (status == KIF_STATUS_OK) status = ReadSlots();
-  bus->read = status == KIF_STATUS_OK;
+  snapshot->read = status == KIF_STATUS_OK;
   return status;
 }
 
 KIF_Status NeedBus() {
-  return bus->read ? KIF_STATUS_OK : ReadBus();
+  return snapshot->read ? KIF_STATUS_OK : ReadBus();
 }
 
 // The different numbers at `level` of the functions that begin with the numbers in `parent`.
@@ -112,11 +114,10 @@ KIF_Status ListLevel(uint32_t level, const KIF_ParamList *parent, KIF_ParamList 
   const KIF_Status busStatus = level == 0 ? ReadBus() : NeedBus();
   if (busStatus != KIF_STATUS_OK) return busStatus;
   bool known = level == 0;
-  for (const PciAddress &function : bus->functions) {
+  for (const PciAddress &function : snapshot->functions) {
     const uint32_t *part = function.part;
     uint32_t same = 0;
-    int64_t wanted;
-    while (same < level && IntegerAt(parent, same, &wanted) && wanted == part[same]) ++same;
+    while (same < level && Integer(parent, same) == part[same]) ++same;
     if (same < level) continue;
     known = true;
     const uint32_t count = CountOf(list);
@@ -133,11 +134,8 @@ KIF_Status ListLevel(uint32_t level, const KIF_ParamList *parent, KIF_ParamList 
 bool TakeHex(const char **text, char end, uint32_t *number) {
   const char *digit = *text;
   uint32_t value = 0;
-  for (; digit - *text < 8; ++digit) {
-    const char lower = static_cast<char>(*digit | 0x20);
-    const bool letter = lower >= 'a' && lower <= 'f';
-    if (!letter && (*digit < '0' || *digit > '9')) break;
-    value = value << 4 | static_cast<uint32_t>(letter ? lower - 'a' + 10 : *digit - '0');
+  for (int worth; digit - *text < 8 && (worth = HexDigit(*digit)) >= 0; ++digit) {
+    value = value << 4 | static_cast<uint32_t>(worth);
   }
   if (digit == *text || *digit != end) return false;
   *text = end != '\0' ? digit + 1 : digit;
@@ -149,8 +147,7 @@ KIF_Status OpenPciFunction(const KIF_ParamList *instance, PciAddress *address,
                            DirectoryReader *folder) {
   uint32_t *part = address->part;
   for (uint32_t i = 0; i < 4; ++i) {
-    int64_t number;
-    if (!IntegerAt(instance, i, &number)) return KIF_STATUS_BAD_PARAMETER;
+    const int64_t number = Integer(instance, i);
     if (number < 0 || number > UINT32_MAX) return KIF_STATUS_NOT_FOUND;
     part[i] = static_cast<uint32_t>(number);
   }
@@ -164,7 +161,7 @@ KIF_Status FindPhysicalSlot(const PciAddress &address, int32_t *number) {
   *number = -1;
   const KIF_Status status = NeedBus();
   if (status != KIF_STATUS_OK) return status;
-  for (const PhysicalSlot &slot : bus->slots) {
+  for (const PhysicalSlot &slot : snapshot->slots) {
     const bool same = slot.segment == address.part[0] && slot.bus == address.part[1] &&
                       (slot.slot == address.part[2] || slot.slot == kEverySlot);
     if (same) *number = slot.number;

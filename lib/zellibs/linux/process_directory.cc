@@ -4,7 +4,7 @@
 
 #include <cstdio>
 
-#include "linux/everlasting.h"
+#include "base/everlasting.h"
 #include "linux/files.h"
 #include "status.h"
 
@@ -15,19 +15,19 @@ struct KeptDirectory {
   Descriptor directory;
 };
 
-Everlasting<KeptDirectory> kept;
+Everlasting<KeptDirectory> snapshot;
 
 }  // namespace
 
 KIF_Status OpenProcessDirectory(int64_t process, bool fresh, int *directory) {
-  if (fresh || process != kept->process) {
+  if (fresh || process != snapshot->process) {
     char path[32];
     snprintf(path, sizeof(path), "/proc/%lld", static_cast<long long>(process));
-    kept->process = -1;
-    const KIF_Status status = OpenHostFile(path, O_PATH | O_DIRECTORY, &kept->directory);
+    snapshot->process = -1;
+    const KIF_Status status = OpenHostFile(path, O_PATH | O_DIRECTORY, &snapshot->directory);
     if (status != KIF_STATUS_OK) return status;
-    kept->process = process;
+    snapshot->process = process;
   }
-  *directory = kept->directory.fd();
+  *directory = snapshot->directory.fd();
   return KIF_STATUS_OK;
 }

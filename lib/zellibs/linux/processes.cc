@@ -8,9 +8,11 @@
 #include <cerrno>
 #include <cstring>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
+#include "linux/command_lines.h"
 #include "linux/files.h"
+#include "linux/process_stat.h"
 #include "linux/userspaces.h"
 #include "status.h"
 
@@ -33,25 +35,6 @@ struct ChildPlace {
 // A pathname below /proc: "PID/task/TID/" and the longest file name used here.
 constexpr size_t kPathSize = 64;
 
-// Long enough for the fields up to num_threads, with any name.
-constexpr size_t kStatSize = 1024;
-
-// One more byte than is kept tells a command line that was cut from one that just fits.
-constexpr size_t kCommandLineRead = kCommandLineSize + 4;
-
-constexpr unsigned long kKernelThreadFlag = 0x00200000;  // PF_KTHREAD, include/linux/sched.h
-
-struct Stat {
-  char state;
-  int32_t parent;
-  int32_t group;
-  int32_t session;
-  uint64_t flags;
-  uint64_t cpuTicks;
-  uint32_t threads;
-  char name[kThreadNameSize];
-};
-
 struct Picture {
   Level level = Level::kNothing;
   Descriptor proc;
@@ -59,85 +42,20 @@ struct Picture {
   Array<Thread> threads;       // as they are listed
   Array<ThreadPlace> byId;     // the threads by ID; made when it is needed
   Array<ChildPlace> byParent;  // the processes by parent, then ID; made when it is needed
-  Bytes commandLines;          // each terminated
   uint32_t nextThread = 0;     // where the next thread asked for is likely to stand
   uint32_t nextProcess = 0;
 };
 
-Everlasting<Picture> picture;
-
-// The command line read last, for the threads of a process that are asked for in a row.
-struct LastCommandLine {
-  int64_t process;
-  bool current;
-  KIF_Status status;
-  char text[kCommandLineSize];
-};
-
-LastCommandLine lastCommandLine;
-
-bool TakeSigned(const char **text, int32_t *value) {
-  while (**text == ' ') ++*text;
-  const bool negative = **text == '-';
-  if (negative) ++*text;
-  uint64_t number;
-  if (!TakeNumber(text, &number)) return false;
-  *value = static_cast<int32_t>(negative ? 0 - number : number);
-  return true;
-}
-
-bool TakeUnsigned(const char **text, uint64_t *value) {
-  while (**text == ' ') ++*text;
-  if (**text == '-') ++*text;
-  return TakeNumber(text, value);
-}
-
-// See proc(5), /proc/pid/stat. The name may hold anything, ')' and blanks too.
-bool ParseStat(const char *text, size_t length, Stat *stat) {
-  const char *open = static_cast<const char *>(memchr(text, '(', length));
-  const char *close = static_cast<const char *>(memrchr(text, ')', length));
-  if (open == nullptr || close == nullptr || close < open || close[1] != ' ') return false;
-  CopyText(stat->name, sizeof(stat->name), open + 1, static_cast<size_t>(close - open - 1));
-  const char *place = close + 2;
-  stat->state = *place;
-  if (stat->state == '\0') return false;
-  ++place;
-  uint64_t skipped;
-  uint64_t userTicks;
-  uint64_t systemTicks;
-  uint64_t threads;
-  bool good = TakeSigned(&place, &stat->parent) && TakeSigned(&place, &stat->group) &&
-              TakeSigned(&place, &stat->session) && TakeUnsigned(&place, &skipped) &&
-              TakeUnsigned(&place, &skipped) && TakeUnsigned(&place, &stat->flags);
-  for (int field = 10; good && field <= 13; ++field) good = TakeUnsigned(&place, &skipped);
-  good = good && TakeUnsigned(&place, &userTicks) && TakeUnsigned(&place, &systemTicks);
-  for (int field = 16; good && field <= 19; ++field) good = TakeUnsigned(&place, &skipped);
-  if (!good || !TakeUnsigned(&place, &threads)) return false;
-  stat->cpuTicks = userTicks + systemTicks;
-  stat->threads = static_cast<uint32_t>(threads);
-  return true;
-}
-
-KIF_Status ReadStat(int directory, const char *path, Stat *stat) {
-  char text[kStatSize];
-  size_t length;
-  const KIF_Status status = ReadPieceBelow(directory, path, text, sizeof(text), &length);
-  if (status != KIF_STATUS_OK) return status;
-  return ParseStat(text, length, stat) ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
-}
+Everlasting<Picture> snapshot;
 
 // The main thread's own file: for that of the process the kernel adds up all its threads.
 KIF_Status ReadThreadStat(int32_t process, int32_t thread, Stat *stat) {
   char path[kPathSize];
   snprintf(path, sizeof(path), "%d/task/%d/stat", process, thread);
-  const KIF_Status status = ReadStat(picture->proc.fd(), path, stat);
+  const KIF_Status status = ReadStat(snapshot->proc.fd(), path, stat);
   if (status != KIF_STATUS_NOT_FOUND || !IsForeignRoot() || process != thread) return status;
   snprintf(path, sizeof(path), "%d/stat", process);  // a tree written by hand may hold no tasks
-  return ReadStat(picture->proc.fd(), path, stat);
-}
-
-bool IsDead(char state) {
-  return state == 'Z' || state == 'X' || state == 'x';
+  return ReadStat(snapshot->proc.fd(), path, stat);
 }
 
 void FillProcess(const Stat &stat, Process *process) {
@@ -146,7 +64,7 @@ void FillProcess(const Stat &stat, Process *process) {
   process->group = stat.group;
   process->session = stat.session;
   process->threads = stat.threads;
-  process->isKernel = (stat.flags & kKernelThreadFlag) != 0;
+  process->isKernel = stat.isKernel;
   process->isZombie = IsDead(stat.state);
 }
 
@@ -162,7 +80,7 @@ KIF_Status AppendThread(uint32_t process, int32_t id, const Stat &stat) {
   thread.id = id;
   thread.process = process;
   FillThread(stat, &thread);
-  return picture->threads.Append(thread) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+  return snapshot->threads.Append(thread) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
 // A directory of numbers, ascending; other names are passed over.
@@ -184,19 +102,19 @@ KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers) {
 
 // Begins a new picture: nothing in it but /proc, open, and its processes' IDs in `ids`.
 KIF_Status BeginPicture(Array<int32_t> *ids) {
-  picture->level = Level::kNothing;
-  picture->processes.Clear();
-  picture->threads.Clear();
-  picture->byId.Clear();
-  picture->byParent.Clear();
-  picture->nextThread = picture->nextProcess = 0;
-  lastCommandLine.current = false;
+  snapshot->level = Level::kNothing;
+  snapshot->processes.Clear();
+  snapshot->threads.Clear();
+  snapshot->byId.Clear();
+  snapshot->byParent.Clear();
+  snapshot->nextThread = snapshot->nextProcess = 0;
+  ForgetCommandLine();
   DirectoryReader proc;
   KIF_Status status = proc.Open("/proc");
   if (status != KIF_STATUS_OK) return status;
   status = ListNumbers(&proc, ids);
   if (status != KIF_STATUS_OK) return status;
-  return OpenBelow(proc.fd(), ".", O_PATH | O_DIRECTORY, &picture->proc);
+  return OpenBelow(proc.fd(), ".", O_PATH | O_DIRECTORY, &snapshot->proc);
 }
 
 Process NewProcess(int32_t id) {
@@ -208,11 +126,11 @@ Process NewProcess(int32_t id) {
 }
 
 KIF_Status AppendOtherThreads(uint32_t place) {
-  const int32_t id = picture->processes[place].id;
+  const int32_t id = snapshot->processes[place].id;
   char path[kPathSize];
   snprintf(path, sizeof(path), "%d/task", id);
   DirectoryReader tasks;
-  if (tasks.OpenBelow(picture->proc.fd(), path) != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
+  if (tasks.OpenBelow(snapshot->proc.fd(), path) != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
   Array<int32_t> ids;
   const KIF_Status listed = ListNumbers(&tasks, &ids);
   if (listed == KIF_STATUS_NO_MEMORY) return listed;
@@ -237,13 +155,13 @@ KIF_Status AppendProcess(int32_t id, bool withThreads) {
   } else if (read != KIF_STATUS_NO_PERMISSION) {
     return KIF_STATUS_OK;  // gone
   }
-  const auto place = static_cast<uint32_t>(picture->processes.size());
+  const auto place = static_cast<uint32_t>(snapshot->processes.size());
   if (!process.isZombie) {
-    process.mainThread = static_cast<uint32_t>(picture->threads.size());
+    process.mainThread = static_cast<uint32_t>(snapshot->threads.size());
     const KIF_Status status = AppendThread(place, id, stat);
     if (status != KIF_STATUS_OK) return status;
   }
-  if (!picture->processes.Append(process)) return KIF_STATUS_NO_MEMORY;
+  if (!snapshot->processes.Append(process)) return KIF_STATUS_NO_MEMORY;
   // A foreign tree need not agree with what the kernel once counted.
   const bool hasOthers = stat.threads > 1 || IsForeignRoot();
   return withThreads && hasOthers ? AppendOtherThreads(place) : KIF_STATUS_OK;
@@ -256,41 +174,41 @@ KIF_Status TakePicture(Level level) {
     status = AppendProcess(ids[i], level == Level::kThreads);
   }
   if (status != KIF_STATUS_OK) return status;
-  status =
-      AssignUserspaces(picture->proc.fd(), picture->processes.begin(), picture->processes.size());
-  if (status == KIF_STATUS_OK) picture->level = level;
+  status = AssignUserspaces(snapshot->proc.fd(), snapshot->processes.begin(),
+                            snapshot->processes.size());
+  if (status == KIF_STATUS_OK) snapshot->level = level;
   return status;
 }
 
 KIF_Status NeedLevel(Level level) {
-  return picture->level >= level ? KIF_STATUS_OK : TakePicture(level);
+  return snapshot->level >= level ? KIF_STATUS_OK : TakePicture(level);
 }
 
 Process *FindProcess(int64_t id) {
-  const uint32_t next = picture->nextProcess;
+  const uint32_t next = snapshot->nextProcess;
   Process *found = nullptr;
-  if (next < picture->processes.size() && picture->processes[next].id == id) {
-    found = &picture->processes[next];
+  if (next < snapshot->processes.size() && snapshot->processes[next].id == id) {
+    found = &snapshot->processes[next];
   } else {
     Process *place = std::lower_bound(
-        picture->processes.begin(), picture->processes.end(), id,
+        snapshot->processes.begin(), snapshot->processes.end(), id,
         [](const Process &process, int64_t wanted) { return process.id < wanted; });
-    if (place != picture->processes.end() && place->id == id) found = place;
+    if (place != snapshot->processes.end() && place->id == id) found = place;
   }
   if (found != nullptr) {
-    picture->nextProcess = static_cast<uint32_t>(found - picture->processes.begin()) + 1;
+    snapshot->nextProcess = static_cast<uint32_t>(found - snapshot->processes.begin()) + 1;
   }
   return found;
 }
 
 // Sorts the threads' places by ID, once for each picture that is asked out of order.
 KIF_Status IndexThreads() {
-  if (picture->byId.size() == picture->threads.size()) return KIF_STATUS_OK;
-  picture->byId.Clear();
-  for (uint32_t i = 0; i < picture->threads.size(); ++i) {
-    if (!picture->byId.Append({picture->threads[i].id, i})) return KIF_STATUS_NO_MEMORY;
+  if (snapshot->byId.size() == snapshot->threads.size()) return KIF_STATUS_OK;
+  snapshot->byId.Clear();
+  for (uint32_t i = 0; i < snapshot->threads.size(); ++i) {
+    if (!snapshot->byId.Append({snapshot->threads[i].id, i})) return KIF_STATUS_NO_MEMORY;
   }
-  std::sort(picture->byId.begin(), picture->byId.end(),
+  std::sort(snapshot->byId.begin(), snapshot->byId.end(),
             [](const ThreadPlace &a, const ThreadPlace &b) { return a.id < b.id; });
   return KIF_STATUS_OK;
 }
@@ -298,19 +216,19 @@ KIF_Status IndexThreads() {
 KIF_Status PlaceOfThread(int64_t id, uint32_t *found) {
   // Readers ask for a thread's values in a row, and for the threads in the order of the list.
   for (const uint32_t step : {0u, 1u}) {
-    const uint32_t place = picture->nextThread + step;
-    if (place < picture->threads.size() && picture->threads[place].id == id) {
-      *found = picture->nextThread = place;
+    const uint32_t place = snapshot->nextThread + step;
+    if (place < snapshot->threads.size() && snapshot->threads[place].id == id) {
+      *found = snapshot->nextThread = place;
       return KIF_STATUS_OK;
     }
   }
   const KIF_Status status = IndexThreads();
   if (status != KIF_STATUS_OK) return status;
   const ThreadPlace *place = std::lower_bound(
-      picture->byId.begin(), picture->byId.end(), id,
+      snapshot->byId.begin(), snapshot->byId.end(), id,
       [](const ThreadPlace &thread, int64_t wanted) { return thread.id < wanted; });
-  if (place == picture->byId.end() || place->id != id) return KIF_STATUS_NOT_FOUND;
-  *found = picture->nextThread = place->place;
+  if (place == snapshot->byId.end() || place->id != id) return KIF_STATUS_NOT_FOUND;
+  *found = snapshot->nextThread = place->place;
   return KIF_STATUS_OK;
 }
 
@@ -324,25 +242,25 @@ KIF_Status ReadMainThread(Process *process) {
   process->isZombie = status == KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
   FillProcess(stat, process);
-  process->mainThread = static_cast<uint32_t>(picture->threads.size());
-  return AppendThread(static_cast<uint32_t>(process - picture->processes.begin()), process->id,
+  process->mainThread = static_cast<uint32_t>(snapshot->threads.size());
+  return AppendThread(static_cast<uint32_t>(process - snapshot->processes.begin()), process->id,
                       stat);
 }
 
 // Reads what the userspaces of a picture of cartels are worked out from.
 KIF_Status AddUserspaces() {
-  for (Process &process : picture->processes) {
+  for (Process &process : snapshot->processes) {
     const KIF_Status status = ReadMainThread(&process);
     if (status == KIF_STATUS_NO_MEMORY || status == KIF_STATUS_NO_RESOURCES) return status;
   }
-  picture->level = Level::kUserspaces;
-  return AssignUserspaces(picture->proc.fd(), picture->processes.begin(),
-                          picture->processes.size());
+  snapshot->level = Level::kUserspaces;
+  return AssignUserspaces(snapshot->proc.fd(), snapshot->processes.begin(),
+                          snapshot->processes.size());
 }
 
 KIF_Status RefreshThread(Thread *thread) {
   Stat stat;
-  const int32_t process = picture->processes[thread->process].id;
+  const int32_t process = snapshot->processes[thread->process].id;
   const KIF_Status status = ReadThreadStat(process, thread->id, &stat);
   if (status != KIF_STATUS_OK) return status;
   if (IsDead(stat.state)) return KIF_STATUS_NOT_FOUND;
@@ -352,7 +270,7 @@ KIF_Status RefreshThread(Thread *thread) {
 
 KIF_Status LookUpCartel(Process *process, ThreadValue value, uint32_t *place) {
   KIF_Status status = KIF_STATUS_OK;
-  if (value == ThreadValue::kInfo && picture->level == Level::kCartels) status = AddUserspaces();
+  if (value == ThreadValue::kInfo && snapshot->level == Level::kCartels) status = AddUserspaces();
   if (status == KIF_STATUS_OK) status = ReadMainThread(process);
   *place = process->mainThread;
   return status;
@@ -360,34 +278,17 @@ KIF_Status LookUpCartel(Process *process, ThreadValue value, uint32_t *place) {
 
 // Finds the thread in the picture, or takes one of more detail where this one cannot have it.
 KIF_Status LookUpThread(int64_t id, ThreadValue value, uint32_t *place) {
-  if (picture->level != Level::kNothing && picture->level < Level::kThreads) {
+  if (snapshot->level != Level::kNothing && snapshot->level < Level::kThreads) {
     Process *process = FindProcess(id);
     if (process == nullptr) {
-      picture->level = Level::kNothing;
-    } else if (picture->level < Level::kProcesses) {
+      snapshot->level = Level::kNothing;
+    } else if (snapshot->level < Level::kProcesses) {
       return LookUpCartel(process, value, place);
     }
   }
   const KIF_Status status =
-      NeedLevel(picture->level == Level::kNothing ? Level::kThreads : picture->level);
+      NeedLevel(snapshot->level == Level::kNothing ? Level::kThreads : snapshot->level);
   return status == KIF_STATUS_OK ? PlaceOfThread(id, place) : status;
-}
-
-KIF_Status ReadCommandLineFile(int32_t id, char *text) {
-  char path[kPathSize];
-  char raw[kCommandLineRead];
-  size_t length;
-  snprintf(path, sizeof(path), "%d/cmdline", id);
-  const KIF_Status status = ReadPieceBelow(picture->proc.fd(), path, raw, sizeof(raw), &length);
-  text[0] = '\0';
-  if (status != KIF_STATUS_OK) return status;
-  for (size_t i = 0; i < length; ++i) {
-    if (raw[i] == '\0') raw[i] = ' ';
-  }
-  CopyText(text, kCommandLineSize, raw, length);
-  length = strlen(text);
-  while (length > 0 && text[length - 1] == ' ') text[--length] = '\0';
-  return length > 0 ? KIF_STATUS_OK : KIF_STATUS_NO_COMMAND_LINE;
 }
 
 // Kernel threads and zombies have no memory and so no program: one look at a link tells, where the
@@ -398,7 +299,7 @@ KIF_Status FindProgram(int32_t id) {
   char path[kPathSize];
   char program[2];
   snprintf(path, sizeof(path), "%d/exe", id);
-  return ReadLinkBelow(picture->proc.fd(), path, program, sizeof(program));
+  return ReadLinkBelow(snapshot->proc.fd(), path, program, sizeof(program));
 }
 
 // Fills what tells a kernel thread or zombie where its program may not be looked at.
@@ -414,28 +315,25 @@ KIF_Status AppendCartel(int32_t id) {
   char text[kCommandLineSize];
   const KIF_Status program = FindProgram(id);
   if (program == KIF_STATUS_NOT_FOUND) return KIF_STATUS_OK;
-  const KIF_Status read = ReadCommandLineFile(id, text);
+  const KIF_Status read = ReadCommandLineFile(snapshot->proc.fd(), id, text);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
-  if (read == KIF_STATUS_OK) {
-    process.commandLine = static_cast<uint32_t>(picture->commandLines.size());
-    if (!picture->commandLines.Append(text, strlen(text) + 1)) return KIF_STATUS_NO_MEMORY;
-  }
+  if (read == KIF_STATUS_OK && !KeepCommandLine(text, &process)) return KIF_STATUS_NO_MEMORY;
   // In a tree of files a command line proves nothing.
   if ((read != KIF_STATUS_OK && program != KIF_STATUS_OK) || IsForeignRoot()) {
     const KIF_Status told = TellByStat(&process);
     if (told != KIF_STATUS_OK && read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
     if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
   }
-  return picture->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
+  return snapshot->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
 KIF_Status IndexChildren() {
-  if (picture->byParent.size() == picture->processes.size()) return KIF_STATUS_OK;
-  picture->byParent.Clear();
-  for (uint32_t i = 0; i < picture->processes.size(); ++i) {
-    if (!picture->byParent.Append({picture->processes[i].parent, i})) return KIF_STATUS_NO_MEMORY;
+  if (snapshot->byParent.size() == snapshot->processes.size()) return KIF_STATUS_OK;
+  snapshot->byParent.Clear();
+  for (uint32_t i = 0; i < snapshot->processes.size(); ++i) {
+    if (!snapshot->byParent.Append({snapshot->processes[i].parent, i})) return KIF_STATUS_NO_MEMORY;
   }
-  std::sort(picture->byParent.begin(), picture->byParent.end(),
+  std::sort(snapshot->byParent.begin(), snapshot->byParent.end(),
             [](const ChildPlace &a, const ChildPlace &b) {
               return a.parent != b.parent ? a.parent < b.parent : a.place < b.place;
             });
@@ -445,25 +343,25 @@ KIF_Status IndexChildren() {
 }  // namespace
 
 KIF_Status TakeThreads(const Thread **threads, size_t *count) {
-  picture->level = Level::kNothing;
+  snapshot->level = Level::kNothing;
   const KIF_Status status = TakePicture(Level::kThreads);
-  *threads = picture->threads.begin();
-  *count = picture->threads.size();
+  *threads = snapshot->threads.begin();
+  *count = snapshot->threads.size();
   return status;
 }
 
 KIF_Status TakeCartels() {
   Array<int32_t> ids;
   KIF_Status status = BeginPicture(&ids);
-  picture->commandLines.Clear();
+  ClearCommandLines();
   for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) status = AppendCartel(ids[i]);
-  if (status == KIF_STATUS_OK) picture->level = Level::kCartels;
+  if (status == KIF_STATUS_OK) snapshot->level = Level::kCartels;
   return status;
 }
 
 KIF_Status ForEachCartel(KIF_Status (*give)(int32_t id, void *context), void *context) {
   KIF_Status status = KIF_STATUS_OK;
-  for (const Process &process : picture->processes) {
+  for (const Process &process : snapshot->processes) {
     if (process.isKernel || process.isZombie) continue;
     status = give(process.id, context);
     if (status != KIF_STATUS_OK) break;
@@ -476,8 +374,8 @@ KIF_Status FindThread(int64_t id, ThreadValue value, const Thread **thread,
   uint32_t place;
   KIF_Status status = LookUpThread(id, value, &place);
   if (status != KIF_STATUS_OK) return status;
-  Thread &found = picture->threads[place];
-  if (!picture->processes[found.process].hasStat) return KIF_STATUS_NO_PERMISSION;
+  Thread &found = snapshot->threads[place];
+  if (!snapshot->processes[found.process].hasStat) return KIF_STATUS_NO_PERMISSION;
   const auto bit = static_cast<uint8_t>(value);
   if ((found.served & bit) != 0) {
     status = RefreshThread(&found);
@@ -485,10 +383,8 @@ KIF_Status FindThread(int64_t id, ThreadValue value, const Thread **thread,
   }
   found.served |= bit;
   *thread = &found;
-  *process = &picture->processes[found.process];
-  if (value == ThreadValue::kInfo && lastCommandLine.process == (*process)->id) {
-    lastCommandLine.current = true;
-  }
+  *process = &snapshot->processes[found.process];
+  if (value == ThreadValue::kInfo) AllowLastCommandLine((*process)->id);
   return KIF_STATUS_OK;
 }
 
@@ -499,10 +395,10 @@ KIF_Status ForEachChild(int64_t parent, KIF_Status (*give)(int32_t id, void *con
   if (status != KIF_STATUS_OK) return status;
   if (FindProcess(parent) == nullptr) return KIF_STATUS_NOT_FOUND;
   const ChildPlace *child = std::lower_bound(
-      picture->byParent.begin(), picture->byParent.end(), parent,
+      snapshot->byParent.begin(), snapshot->byParent.end(), parent,
       [](const ChildPlace &place, int64_t wanted) { return place.parent < wanted; });
-  for (; child != picture->byParent.end() && child->parent == parent; ++child) {
-    status = give(picture->processes[child->place].id, context);
+  for (; child != snapshot->byParent.end() && child->parent == parent; ++child) {
+    status = give(snapshot->processes[child->place].id, context);
     if (status != KIF_STATUS_OK) return status;
   }
   return KIF_STATUS_OK;
@@ -517,24 +413,9 @@ KIF_Status FindChild(int64_t parent, int64_t child, const Process **process) {
 
 KIF_Status ReadCommandLine(int64_t id, char *text) {
   if (id <= 0 || id > INT32_MAX) return KIF_STATUS_NOT_FOUND;
-  if (picture->level == Level::kNothing) {
+  if (snapshot->level == Level::kNothing) {
     const KIF_Status status = TakeCartels();
     if (status != KIF_STATUS_OK) return status;
   }
-  Process *process = FindProcess(id);
-  if (process != nullptr && process->commandLine != kNoCommandLine) {
-    strcpy(text, picture->commandLines.text() + process->commandLine);
-    process->commandLine = kNoCommandLine;
-    return KIF_STATUS_OK;
-  }
-  if (lastCommandLine.process != id || !lastCommandLine.current) {
-    KIF_Status status = ReadCommandLineFile(static_cast<int32_t>(id), lastCommandLine.text);
-    // One that was listed has ended since, which is no failure to whoever walks the list.
-    if (status == KIF_STATUS_NOT_FOUND && process != nullptr) status = KIF_STATUS_NO_COMMAND_LINE;
-    lastCommandLine.status = status;
-    lastCommandLine.process = id;
-  }
-  lastCommandLine.current = false;
-  strcpy(text, lastCommandLine.text);
-  return lastCommandLine.status;
+  return TakeCommandLine(snapshot->proc.fd(), static_cast<int32_t>(id), FindProcess(id), text);
 }

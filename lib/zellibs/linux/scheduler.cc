@@ -144,8 +144,7 @@ KIF_Status GetCpuInfo(const NodeInfo &, const KIF_ParamList *, void *record) {
 
 // The whole machine is group 0; there are no others.
 KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
-  int64_t group;
-  if (!IntegerAt(instance, 0, &group) || group != 0) return KIF_STATUS_NOT_FOUND;
+  if (Integer(instance, 0) != 0) return KIF_STATUS_NOT_FOUND;
   char text[128];
   const KIF_Status status = ReadHostFile("/proc/loadavg", text, sizeof(text));
   if (status != KIF_STATUS_OK) return status;

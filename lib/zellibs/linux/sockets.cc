@@ -9,8 +9,8 @@
 #include <cstring>
 #include <iterator>
 
-#include "linux/array.h"
-#include "linux/everlasting.h"
+#include "base/array.h"
+#include "base/everlasting.h"
 #include "linux/files.h"
 #include "status.h"
 
@@ -79,7 +79,7 @@ struct Sockets {
   Array<Socket> byInode;
 };
 
-Everlasting<Sockets> sockets;
+Everlasting<Sockets> snapshot;
 
 // The name at `number` of a list; null where it has none.
 template <size_t kCount>
@@ -103,9 +103,9 @@ unsigned long HexadecimalField(const char *line, unsigned index) {
 }
 
 KIF_Status IndexLines(size_t start, uint8_t table) {
-  const char *texts = sockets->texts.text();
-  for (size_t line = start; line < sockets->texts.size();) {
-    const size_t rest = sockets->texts.size() - line;
+  const char *texts = snapshot->texts.text();
+  for (size_t line = start; line < snapshot->texts.size();) {
+    const size_t rest = snapshot->texts.size() - line;
     const void *newline = memchr(texts + line, '\n', rest);
     const size_t length =
         newline != nullptr ? static_cast<size_t>(static_cast<const char *>(newline) - texts) - line
@@ -114,7 +114,7 @@ KIF_Status IndexLines(size_t start, uint8_t table) {
     uint64_t inode;
     // Sockets that no process holds any more, or not yet, have the number 0.
     if (TakeNumber(&field, &inode) && inode != 0 &&
-        !sockets->byInode.Append({inode, line, length, table})) {
+        !snapshot->byInode.Append({inode, line, length, table})) {
       return KIF_STATUS_NO_MEMORY;
     }
     line += length + 1;
@@ -128,8 +128,8 @@ KIF_Status ReadTable(int net, uint8_t table) {
   KIF_Status status = OpenBelow(net, kTables[table].file, O_RDONLY, &file);
   if (status == KIF_STATUS_NO_RESOURCES || status == KIF_STATUS_NO_MEMORY) return status;
   if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
-  const size_t start = sockets->texts.size();
-  status = sockets->texts.ReadAll(file.fd());
+  const size_t start = snapshot->texts.size();
+  status = ReadWhole(file, &snapshot->texts);
   return status == KIF_STATUS_NO_MEMORY ? status : IndexLines(start, table);
 }
 
@@ -152,7 +152,7 @@ KIF_Status OpenTables(int process, Descriptor *net) {
 }
 
 const Socket *FindSocket(uint64_t inode) {
-  const Array<Socket> &known = sockets->byInode;
+  const Array<Socket> &known = snapshot->byInode;
   const Socket *found =
       std::lower_bound(known.begin(), known.end(), inode,
                        [](const Socket &socket, uint64_t wanted) { return socket.inode < wanted; });
@@ -270,26 +270,27 @@ void FormatPacket(const char *line, char *text, size_t size) {
 KIF_Status ReadSocketsOf(int process) {
   uint64_t number;
   if (NamespaceOf(process, &number) != KIF_STATUS_OK) return KIF_STATUS_OK;
-  const Array<uint64_t> &known = sockets->namespaces;
+  const Array<uint64_t> &known = snapshot->namespaces;
   if (std::find(known.begin(), known.end(), number) != known.end()) return KIF_STATUS_OK;
   Descriptor net;
   KIF_Status status = OpenTables(process, &net);
   if (status == KIF_STATUS_NO_RESOURCES) return status;
   if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
-  const size_t before = sockets->byInode.size();
+  const size_t before = snapshot->byInode.size();
   for (uint8_t table = 0; status == KIF_STATUS_OK && table < std::size(kTables); ++table) {
     status = ReadTable(net.fd(), table);
   }
   // A process that ended meanwhile showed a part of them at most; the next one is asked.
   uint64_t still;
   if (NamespaceOf(process, &still) != KIF_STATUS_OK || still != number) {
-    sockets->byInode.Truncate(before);
-  } else if (!sockets->namespaces.Append(number)) {
+    snapshot->byInode.Truncate(before);
+  } else if (!snapshot->namespaces.Append(number)) {
     status = KIF_STATUS_NO_MEMORY;
   }
-  std::sort(sockets->byInode.begin(), sockets->byInode.end(), [](const Socket &a, const Socket &b) {
-    return a.inode != b.inode ? a.inode < b.inode : a.line < b.line;
-  });
+  std::sort(snapshot->byInode.begin(), snapshot->byInode.end(),
+            [](const Socket &a, const Socket &b) {
+              return a.inode != b.inode ? a.inode < b.inode : a.line < b.line;
+            });
   return status;
 }
 
@@ -297,7 +298,7 @@ bool DescribeSocket(uint64_t inode, char *text, size_t size) {
   const Socket *socket = FindSocket(inode);
   if (socket == nullptr) return false;
   const Table &table = kTables[socket->table];
-  const char *line = sockets->texts.text() + socket->line;
+  const char *line = snapshot->texts.text() + socket->line;
   switch (table.layout) {
     case Layout::kInternet:
       return FormatInternet(table, line, text, size);

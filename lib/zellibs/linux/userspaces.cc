@@ -4,7 +4,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "linux/array.h"
+#include "base/array.h"
 #include "linux/files.h"
 #include "status.h"
 

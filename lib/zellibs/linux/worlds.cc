@@ -33,10 +33,6 @@ KIF_Status AppendInteger(int32_t id, void *list) {
   return KIF_ParamListAddInt(static_cast<KIF_ParamList *>(list), id);
 }
 
-int64_t FirstInteger(const KIF_ParamList *instance) {
-  return instance->params[0].integer;
-}
-
 // KVM names the threads of a guest's processors "CPU 0/KVM".
 bool IsVirtualCpu(const char *name) {
   uint64_t number;
@@ -71,8 +67,7 @@ KIF_Status ListWorlds(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *li
 KIF_Status GetWorldName(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const Thread *thread;
   const Process *process;
-  const KIF_Status status =
-      FindThread(FirstInteger(instance), ThreadValue::kName, &thread, &process);
+  const KIF_Status status = FindThread(Integer(instance, 0), ThreadValue::kName, &thread, &process);
   if (status == KIF_STATUS_OK) strcpy(static_cast<char *>(record), thread->name);
   return status;
 }
@@ -80,8 +75,7 @@ KIF_Status GetWorldName(const NodeInfo &, const KIF_ParamList *instance, void *r
 KIF_Status GetWorldInfo(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const Thread *thread;
   const Process *process;
-  const KIF_Status status =
-      FindThread(FirstInteger(instance), ThreadValue::kInfo, &thread, &process);
+  const KIF_Status status = FindThread(Integer(instance, 0), ThreadValue::kInfo, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
   auto *info = static_cast<WorldInfo *>(record);
   info->worldID = static_cast<uint32_t>(thread->id);
@@ -100,7 +94,7 @@ KIF_Status GetSummaryStats(const NodeInfo &, const KIF_ParamList *instance, void
   const Thread *thread;
   const Process *process;
   const KIF_Status status =
-      FindThread(FirstInteger(instance), ThreadValue::kState, &thread, &process);
+      FindThread(Integer(instance, 0), ThreadValue::kState, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
   State found = {thread->state, kOther, kNone};
   for (const State &state : kStates) {
@@ -116,7 +110,7 @@ KIF_Status GetStateTimes(const NodeInfo &, const KIF_ParamList *instance, void *
   const Thread *thread;
   const Process *process;
   const KIF_Status status =
-      FindThread(FirstInteger(instance), ThreadValue::kTimes, &thread, &process);
+      FindThread(Integer(instance, 0), ThreadValue::kTimes, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
   constexpr uint64_t kTicksPerSecond = 100;  // USER_HZ, the same on every architecture but one
   static_cast<SchedStateTimes *>(record)->usedTime = thread->cpuTicks * (1000000 / kTicksPerSecond);
@@ -129,16 +123,16 @@ KIF_Status ListCartels(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *l
 }
 
 KIF_Status GetCommandLine(const NodeInfo &, const KIF_ParamList *instance, void *record) {
-  return ReadCommandLine(FirstInteger(instance), static_cast<char *>(record));
+  return ReadCommandLine(Integer(instance, 0), static_cast<char *>(record));
 }
 
 KIF_Status ListChildren(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
-  return ForEachChild(FirstInteger(parent), AppendInteger, list);
+  return ForEachChild(Integer(parent, 0), AppendInteger, list);
 }
 
 KIF_Status GetChild(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const Process *child;
-  const KIF_Status status = FindChild(FirstInteger(instance), instance->params[1].integer, &child);
+  const KIF_Status status = FindChild(Integer(instance, 0), Integer(instance, 1), &child);
   if (status != KIF_STATUS_OK) return status;
   static_cast<ChildRecord *>(record)->childState = child->isZombie ? kChildStateZombie : 0;
   return KIF_STATUS_OK;

@@ -13,13 +13,29 @@ class Array {
  public:
   Array() = default;
   ~Array() { free(items_); }
-  Array(const Array &) = delete;
-  Array &operator=(const Array &) = delete;
+  Array(Array &&other) noexcept { Swap(other); }
+  Array &operator=(Array &&other) noexcept {
+    Swap(other);
+    return *this;
+  }
 
   // False without memory; the array is then as it was.
   bool Append(const T &item) {
-    if (size_ == capacity_ && !Grow()) return false;
+    if (!Reserve(1)) return false;
     items_[size_++] = item;
+    return true;
+  }
+  // Makes room for `more` items behind the present ones, so that appending them cannot fail. False
+  // without memory.
+  bool Reserve(size_t more) {
+    if (more <= capacity_ - size_) return true;
+    const size_t doubled = capacity_ == 0 ? 64 : capacity_ * 2;
+    const size_t capacity = size_ + more > doubled ? size_ + more : doubled;
+    // NOLINTNEXTLINE(bugprone-sizeof-expression): the items may be pointers
+    void *grown = realloc(items_, capacity * sizeof(T));
+    if (grown == nullptr) return false;
+    items_ = static_cast<T *>(grown);
+    capacity_ = capacity;
     return true;
   }
   void Clear() { size_ = 0; }
@@ -40,16 +56,6 @@ class Array {
   const T *end() const { return items_ + size_; }
 
  private:
-  bool Grow() {
-    const size_t capacity = capacity_ == 0 ? 64 : capacity_ * 2;
-    // NOLINTNEXTLINE(bugprone-sizeof-expression): the items may be pointers
-    void *grown = realloc(items_, capacity * sizeof(T));
-    if (grown == nullptr) return false;
-    items_ = static_cast<T *>(grown);
-    capacity_ = capacity;
-    return true;
-  }
-
   T *items_ = nullptr;
   size_t size_ = 0;
   size_t capacity_ = 0;

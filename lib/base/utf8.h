@@ -1,10 +1,7 @@
-// What a text may hold that is shown on a terminal. Header only: the program and the platform
-// library both need it and share no code otherwise.
+// UTF-8 in texts that come from anywhere, and what a terminal may be shown of them.
 #pragma once
 
 #include <cstddef>
-
-namespace printable {
 
 // Whether a sequence may begin with these two bytes: not a longer way to write a character, no half
 // of a pair of UTF-16 and nothing above U+10FFFF (RFC 3629, section 4).
@@ -26,6 +23,16 @@ inline size_t SequenceLength(const unsigned char *text, size_t size) {
     if ((text[i] & 0xc0) != 0x80) return 0;
   }
   return length;
+}
+
+inline bool IsUtf8(const char *text, size_t size) {
+  const auto *bytes = reinterpret_cast<const unsigned char *>(text);
+  for (size_t i = 0; i < size;) {
+    const size_t length = bytes[i] < 0x80 ? 1 : SequenceLength(bytes + i, size - i);
+    if (length == 0) return false;
+    i += length;
+  }
+  return true;
 }
 
 // Turns the control characters among `size` bytes into '?'. Terminals obey the bytes 0x80 to 0x9f
@@ -55,5 +62,3 @@ inline size_t CutAtCharacter(const char *text, size_t size, size_t most) {
   const auto *bytes = reinterpret_cast<const unsigned char *>(text);
   return SequenceLength(bytes + cut, size - cut) > most - cut ? cut : most;
 }
-
-}  // namespace printable
