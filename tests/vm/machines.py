@@ -27,22 +27,12 @@ def disks(*devices):
 BOOT_LOADER = ('BOOT_IMAGE=/boot/vmlinuz-cloud root=/dev/vda1 ro audit=1 fsck.mode=force '
                'BOOTIF=01-52-54-00-00-00-01 console=ttyS0 panic=-1 quiet')
 
-# name: architecture, whether its recording is kept in tests/hosts, the kernel's command line, QEMU.
+# name: architecture, the kernel's command line, QEMU.
 # With "overlay" on its command line a machine's root lies in memory over an archive.
 MACHINES = {
-    'pc': ('amd64', True, 'console=ttyS0 panic=-1 quiet',
+    'pc': ('amd64', 'console=ttyS0 panic=-1 quiet',
            PC + ['-smp', '1', '-vga', 'std'] + networks('e1000') + disks('ide-hd')),
-    'pc-bridges': ('amd64', True, 'console=ttyS0 panic=-1 quiet audit=1',
-                   PC + ['-smp', '4',
-                         '-device', 'pci-bridge,id=b1,chassis_nr=1,addr=8',
-                         '-device', 'pci-bridge,id=b2,bus=b1,chassis_nr=2,addr=3'] +
-                   networks('virtio-net-pci,bus=b1,addr=1', 'vmxnet3,bus=b2,addr=1',
-                            'rtl8139,bus=b2,addr=2') +
-                   disks('virtio-blk-pci,bus=b2,addr=4', 'nvme,serial=n1,bus=b1,addr=5')),
-    'q35': ('amd64', True, BOOT_LOADER + ' overlay',
-            Q35 + ['-smp', '1', '-device', 'virtio-rng-pci', '-device', 'virtio-serial-pci'] +
-            networks('virtio-net-pci')),
-    'q35-bridges': ('amd64', True, BOOT_LOADER,
+    'q35-bridges': ('amd64', BOOT_LOADER + ' overlay',
                     Q35 + ['-smp', '4', '-vga', 'std',
                            '-device', 'pcie-root-port,id=r1,chassis=1,slot=1,addr=4.0,'
                                       'multifunction=on',
@@ -54,7 +44,7 @@ MACHINES = {
                            '-device', 'virtio-scsi-pci,bus=r2'] +
                     networks('virtio-net-pci,bus=r1', 'e1000,bus=p1,addr=1') +
                     disks('nvme,serial=n1,addr=6', 'scsi-hd')),
-    'arm64': ('arm64', True, 'console=ttyAMA0 panic=-1 quiet',
+    'arm64': ('arm64', 'console=ttyAMA0 panic=-1 quiet',
               ['-M', 'virt', '-cpu', 'cortex-a57', '-smp', '2',
                '-device', 'pcie-root-port,id=r1,chassis=1,slot=1,addr=4'] +
               networks('virtio-net-pci,bus=r1') + disks('nvme,serial=n1')),
