@@ -130,6 +130,10 @@ bool IsTool(const std::string &word) {
          access((BIN_DIR "/" + word).c_str(), X_OK) == 0;
 }
 
+bool RunsApart(const Lines &command) {
+  return command[0].starts_with("$ apart ") || Join(command).find("pkill") != std::string::npos;
+}
+
 // Whatever a command does that is run so, it reaches no process but its own.
 Lines Apart(const Lines &command) {
   Lines apart = {"unshare", "--pid", "--fork", "--mount-proc", "--kill-child"};
@@ -143,12 +147,14 @@ class CaseTest : public HostTest {
   explicit CaseTest(const Case &one) : case_(one) {}
 
   void TestBody() override {
-    if (case_.transcript->path.find("pkill") != std::string::npos &&
-        Run(Apart({"true"})).status != 0) {
-      GTEST_SKIP() << "may not make a PID namespace";
-    }
     WriteHost();
-    for (const size_t index : case_.commands) Check(&case_.transcript->parts[index]);
+    for (const size_t index : case_.commands) {
+      Part *command = &case_.transcript->parts[index];
+      if (RunsApart(command->text) && Run(Apart({"true"})).status != 0) {
+        GTEST_SKIP() << "may not make a PID namespace";
+      }
+      Check(command);
+    }
     if (getenv("RENEW") != nullptr) Save();
   }
 
@@ -158,7 +164,7 @@ class CaseTest : public HostTest {
   void Check(Part *command);
   void Compare(Part *command, const Lines &lines, const char *way);
   Lines RunCommand(const std::string &words, const std::string &program,
-                   const std::string &arguments, const std::string &host);
+                   const std::string &arguments, const std::string &host, bool apart);
   void Save() const;
 
   const Case &case_;
@@ -214,7 +220,7 @@ void CaseTest::WriteTree(const Lines &lines) {
 }
 
 Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
-                           const std::string &arguments, const std::string &host) {
+                           const std::string &arguments, const std::string &host, bool apart) {
   // FAIL=operation:n[:status] becomes the words that the preloaded library knows.
   std::string line = words;
   std::string preloaded;
@@ -234,7 +240,7 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
   }
   line = "PATH=" + Link(BIN_DIR) + ":$PATH\n" + line + program + arguments;
   std::vector<std::string> run = {"sh", "-c", line};
-  if (line.find("pkill") != line.npos) run = Apart({"bash", "-c", line});
+  if (apart) run = Apart({"bash", "-c", line});
   std::error_code none;
   if (IsTool(program.substr(program.rfind(' ') + 1))) {
     std::filesystem::remove(Scratch() + "/trace", none);
@@ -253,19 +259,21 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
 void CaseTest::Check(Part *command) {
   std::string line = command->text[0].substr(2);
   for (size_t i = 1; i < command->text.size(); ++i) line += "\n" + command->text[i].substr(2);
-  static const std::regex kWords("(live |cached )?((?:\\w+=\\S* )*)([^\\s;|&<>]+)([^]*)");
+  static const std::regex kWords("(live |cached |apart )?((?:\\w+=\\S* )*)([^\\s;|&<>]+)([^]*)");
   std::smatch parts;
   if (!std::regex_match(line, parts, kWords)) {
     ADD_FAILURE_AT(case_.transcript->path.c_str(), command->line) << "no command";
     return;
   }
   const std::string way = parts[1], words = parts[2], program = parts[3], arguments = parts[4];
-  const bool cache = host_.ends_with(".kif") && IsTool(program) && way != "live " &&
-                     words.find("ZELLIBS_HOST=") == words.npos;
-  if (way != "cached ") Compare(command, RunCommand(words, program, arguments, host_), "live");
+  const bool apart = RunsApart(command->text);
+  const bool cache = host_.ends_with(".kif") && IsTool(program) &&
+                     (way == "" || way == "cached ") && words.find("ZELLIBS_HOST=") == words.npos;
+  if (way != "cached ")
+    Compare(command, RunCommand(words, program, arguments, host_, apart), "live");
   if (!cache) return;
   const std::string file = "zlkkiftools -c host.kif " + program;
-  Compare(command, RunCommand(words, file, arguments, "none"), "cached");
+  Compare(command, RunCommand(words, file, arguments, "none", apart), "cached");
 }
 
 void CaseTest::Compare(Part *command, const Lines &lines, const char *way) {

@@ -1,3 +1,4 @@
+# shellcheck shell=bash
 # Sourced by bash, process 1 of a namespace: the processes 3, "one", and 4, "two", tell which
 # signals reach them, and heard prints the next.
 mkfifo heard.$BASHPID
