@@ -62,7 +62,8 @@ Lines Readable(const std::string &bytes, const std::string &prefix) {
     }
     for (size_t i = 0; i < line.size();) {
       const auto *at = reinterpret_cast<const unsigned char *>(line.data()) + i;
-      const size_t length = SequenceLength(at, line.size() - i);
+      size_t length = SequenceLength(at, line.size() - i);
+      if (*at == 0xc2 && length > 0 && at[1] < 0xa0) length = 0;  // a control character too
       char escape[8] = {line[i]};
       if (*at == '\t') snprintf(escape, sizeof(escape), "\\t");
       if (*at == '\\') snprintf(escape, sizeof(escape), "\\\\");
