@@ -111,7 +111,7 @@ Outcome HostTest::Linux(const std::string &root, const std::vector<std::string> 
                         Surroundings surroundings) {
   std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools"};
   commandLine.insert(commandLine.end(), arguments.begin(), arguments.end());
-  return RunTool(commandLine, std::move(surroundings), "linux:" + root);
+  return RunTool(commandLine, std::move(surroundings), root == "/" ? "linux" : "linux:" + root);
 }
 
 Outcome HostTest::RunTool(const std::vector<std::string> &commandLine, Surroundings surroundings,

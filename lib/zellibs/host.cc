@@ -25,7 +25,10 @@ Choice ChooseByEnvironment() {
     return {true, true, KIF_STATUS_OK, &kLinuxHost};
   }
   if (strncmp(name, kLinux, kLinuxLength) == 0 && name[kLinuxLength] == ':') {
-    SetLinuxRoot(name + kLinuxLength + 1);
+    const char *root = name + kLinuxLength + 1;
+    // A script's variable that is not set must not turn a stranger's tree into this machine.
+    if (root[0] == '\0') return {true, true, KIF_STATUS_BAD_PARAMETER, nullptr};
+    SetLinuxRoot(root);
     return {true, true, KIF_STATUS_OK, &kLinuxHost};
   }
   if (strcmp(name, "none") == 0) return {true, false, KIF_STATUS_NO_HOST, nullptr};

@@ -49,5 +49,5 @@ extern const Host kLinuxHost;
 // Opens the cache file at `path` as the recorded host; `*host` is then its methods.
 KIF_Status OpenRecordedHost(const char *path, const Host **host);
 
-// Puts `root` in front of /proc, /sys, /dev, /boot and /etc.
+// Puts `root`, a text that stays, in front of /proc, /sys, /dev, /boot and /etc.
 void SetLinuxRoot(const char *root);

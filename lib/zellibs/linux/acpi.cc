@@ -18,6 +18,9 @@ namespace {
 // Bytes of a table in one record.
 constexpr uint32_t kMostData = sizeof(TableBuffer::data);
 
+// No firmware comes near it, but a file of holes in somebody's tree may have any length.
+constexpr off_t kMostBytes = 16 << 20;
+
 // Tables that were loaded after boot have a folder of their own.
 constexpr const char *kFolders[] = {"/sys/firmware/acpi/tables",
                                     "/sys/firmware/acpi/tables/dynamic"};
@@ -110,6 +113,7 @@ KIF_Status ListAcpiBuffers(const NodeInfo &, const KIF_ParamList *parent, KIF_Pa
   if (status != KIF_STATUS_OK) return status;
   struct stat facts;
   if (fstat(file.fd(), &facts) != 0) return StatusOfErrno(errno);
+  if (facts.st_size > kMostBytes) return KIF_STATUS_TOO_LARGE;
   const int64_t count = (facts.st_size + kMostData - 1) / kMostData;
   for (int64_t i = 0; status == KIF_STATUS_OK && i < count; ++i) {
     status = KIF_ParamListAddInt(list, i);

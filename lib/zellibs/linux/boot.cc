@@ -191,7 +191,8 @@ KIF_Status GetBootOptionFileLength(const NodeInfo &, const KIF_ParamList *instan
   struct stat facts;
   const KIF_Status status = OpenBootOptionFile(TextAt(instance, 0), &file, &facts);
   if (status != KIF_STATUS_OK) return status;
-  if (facts.st_size > UINT32_MAX) return KIF_STATUS_TOO_LARGE;
+  constexpr off_t kMostBytes = 64 << 20;
+  if (facts.st_size > kMostBytes) return KIF_STATUS_TOO_LARGE;
   *length = static_cast<uint32_t>(facts.st_size);
   return KIF_STATUS_OK;
 }

@@ -41,14 +41,15 @@ class Descriptor {
 };
 
 // As Bytes::ReadAll, with a status.
-KIF_Status ReadWhole(const Descriptor &file, Bytes *bytes);
+KIF_Status ReadWhole(const Descriptor &file, Bytes *bytes, size_t most = size_t{64} << 20);
 
 // True where the host is a tree of files taken from elsewhere, and system calls about processes
 // or devices do not speak of it.
 bool IsForeignRoot();
 
 // Opens `path`, absolute on the host ("/proc/uptime"), with O_CLOEXEC added to `flags`. The status
-// tells why it could not.
+// tells why it could not. In a foreign tree no path leads out of it, and what is neither a regular
+// file nor a folder is not found.
 KIF_Status OpenHostFile(const char *path, int flags, Descriptor *file);
 
 // The same for a path below an open directory.

@@ -64,6 +64,9 @@ constexpr const char *kNetlinkProtocols[] = {
     "SCSITRANSPORT", "ECRYPTFS", "RDMA",     "CRYPTO",         "SMC",
 };
 
+// Of the tables of all namespaces together.
+constexpr size_t kMostText = size_t{256} << 20;
+
 struct Socket {
   uint64_t inode;
   size_t line;    // place in the texts
@@ -129,7 +132,7 @@ KIF_Status ReadTable(int net, uint8_t table) {
   if (status == KIF_STATUS_NO_RESOURCES || status == KIF_STATUS_NO_MEMORY) return status;
   if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
   const size_t start = snapshot->texts.size();
-  status = ReadWhole(file, &snapshot->texts);
+  status = ReadWhole(file, &snapshot->texts, start < kMostText ? kMostText - start : 0);
   return status == KIF_STATUS_NO_MEMORY ? status : IndexLines(start, table);
 }
 
