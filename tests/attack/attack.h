@@ -80,53 +80,38 @@ struct Command {
   bool onCache = true;  // whether a cache run does it too
 };
 
-inline const std::vector<Command> kCommands = {
-    {{"lspci"}},
-    {{"lspci", "-v"}},
-    {{"lspci", "-n"}},
-    {{"lspci", "-p"}},
-    {{"lspci", "-e"}},
-    {{"lspci", "-d"}},
-    {{"ps"}},
-    {{"ps", "-ugjstTPZv"}},
-    {{"ps", "-Ciz"}},
-    {{"ps", "-Jcv"}},
-    {{"ps", "-JnN"}},
-    {{"ps", "-U1"}},
-    {{"ps", "-U9"}},
-    {{"hwclock"}},
-    {{"hwclock", "-t", "01:02:03", "-d", "04/05/2026"}},
-    {{"zelvar"}},
-    {{"zelvar", "-v"}},
-    {{"zelvar", "-l"}},
-    {{"irqinfo"}},
-    {{"bootOption", "-a"}},
-    {{"bootOption", "-pkmob"}},
-    {{"bootOption", "-r", "-k"}},
-    {{"bootOption", "-c", "boot.cfg"}, false},
-    {{"bootOption", "-C"}, false},
-    {{"amldump"}},
-    {{"pci-info", "-n", "0", "-b", "0", "-s", "31", "-f", "2", "-i"}},
-    {{"pci-info", "-n", "0", "-b", "0", "-s", "31", "-f", "2", "-h"}},
-    {{"pci-info", "-n", "0", "-b", "0", "-s", "31", "-f", "2", "-c"}},
-    {{"pci-info", "-n", "0", "-b", "0", "-s", "31", "-f", "2", "-e"}},
-    {{"pci-info", "-n", "0", "-b", "0", "-s", "31", "-f", "2", "-S"}},
-    {{"pidof", "init", "daemon"}},
-    {{"pidof", "-s", "-x", "-o", "5000001", "daemon"}},
-    {{"userspaceof", "5000001"}},
-    {{"mdu"}, false},
-    {{"mdu", "-ah"}, false},
-    {{"mdu", "-u"}, false},
-    {{"lsof"}},
-    {{"mdf"}},
-    {{"mdf", "-h"}},
-    {{"mdf", "-p"}},
-    {{"pkill", "init", "daemon"}, false},
-    {{"pkill", "-9", "-f", "all"}, false},
-    {{"pgrep", "."}},
-    {{"pgrep", "-flv", "daemon"}},
-    {{"uptime"}},
-};
+// Every tool with what makes it go another way; after "live", where a recording does not serve it.
+inline constexpr char kCommandLines[] =
+    "lspci;lspci -v;lspci -n;lspci -p;lspci -e;lspci -nd;ps;ps -ugjstTPZv;ps -Ciz;ps -Jcv;ps -JnN;"
+    "ps -U1;ps -U9;ps -cU;hwclock;hwclock -t 01:02:03 -d 04/05/2026;zelvar;zelvar -v;zelvar -l;"
+    "irqinfo;bootOption -a;bootOption -pkmob;bootOption -r -k;live bootOption -c boot.cfg;"
+    "live bootOption -C;amldump;pci-info -n 0 -b 0 -s 31 -f 2 -i;pci-info -n 0 -b 0 -s 31 -f 2 -h;"
+    "pci-info -n 0 -b 0 -s 31 -f 2 -c;pci-info -n 0 -b 0 -s 31 -f 2 -e;"
+    "pci-info -n 0 -b 0 -s 31 -f 2 -S;pidof init daemon sleep;"
+    "pidof -s -x -o 5000001 daemon;userspaceof 5000001;live mdu;live mdu -ah;live mdu -u;lsof;mdf;"
+    "mdf -h;mdf -p;live pkill init daemon;live pkill -9 -f all;pgrep .;pgrep -flv daemon;uptime;";
+
+inline std::vector<Command> Commands() {
+  std::vector<Command> commands(1);
+  std::string word;
+  for (const char c : std::string(kCommandLines)) {
+    Command &last = commands.back();
+    if (c != ' ' && c != ';') {
+      word += c;
+    } else if (word == "live") {
+      last.onCache = false;
+      word.clear();
+    } else {
+      last.arguments.push_back(std::move(word));
+      word.clear();
+    }
+    if (c == ';') commands.emplace_back();
+  }
+  commands.pop_back();
+  return commands;
+}
+
+inline const std::vector<Command> kCommands = Commands();
 
 // The long way through, asked for by ./test --all; the short one takes samples.
 inline bool IsLong() {

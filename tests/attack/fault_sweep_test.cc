@@ -133,16 +133,6 @@ TEST_F(FaultSweep, Kifcache) {
   }
 }
 
-TEST_F(FaultSweep, KifcacheWithoutTheBytesOfAContent) {
-  Surroundings surroundings = Failing("KIFData_GetData", 1);
-  surroundings.environment.push_back("ZELLIBS_HOST=" + Record(kWholeHost));
-  const std::string file = Scratch() + "/made.kif";
-  const Outcome outcome = Run({BIN_DIR "/kifcache", "record", file}, surroundings);
-  EXPECT_EQ(outcome.err, "kifcache: out of memory\n");
-  EXPECT_EQ(outcome.status, 1);
-  EXPECT_NE(access(file.c_str(), F_OK), 0);
-}
-
 // The Linux host allocates for itself.
 TEST_F(FaultSweep, AllocationsOfTheLinuxHost) {
   for (const Command &command : kCommands) {
