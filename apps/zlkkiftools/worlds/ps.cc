@@ -5,6 +5,7 @@
 
 #include "tools.h"
 #include "worlds/ps_options.h"
+#include "worlds/ps_printer.h"
 #include "worlds/world_list.h"
 
 namespace {
@@ -43,24 +44,10 @@ struct OptionLetter {
   PsOptions options;
 };
 
+// The letters that show no column.
 constexpr OptionLetter kOptionLetters[] = {
-    {'C', PS_CARTELS_ONLY},
-    {'P', PS_PCID},
-    {'T', PS_TIME},
-    {'c', PS_COMMAND},
-    {'g', PS_PGID_SID},
-    {'i', PS_SUMMARY},
-    {'j', PS_GID},
-    {'n', PS_NCHILDREN},
-    {'N', PS_NTHREADS},
-    {'s', PS_STATE},
-    {'t', PS_TYPE},
-    {'u', PS_USERWORLDS_ONLY},
-    {'U', PS_USERSPACE},
-    {'v', PS_VERBOSE},
-    {'Z', PS_SECURITY_DOMAIN},
-    {'z', PS_ZOMBIES},
-    {'J', PS_TREE | PS_USERWORLDS_ONLY | PS_ZOMBIES},
+    {'C', PS_CARTELS_ONLY}, {'i', PS_SUMMARY}, {'u', PS_USERWORLDS_ONLY},
+    {'v', PS_VERBOSE},      {'z', PS_ZOMBIES}, {'J', PS_TREE | PS_USERWORLDS_ONLY | PS_ZOMBIES},
 };
 
 // The display options of a letter; 0 for any other.
@@ -68,7 +55,7 @@ PsOptions OptionsOf(int letter) {
   for (const OptionLetter &row : kOptionLetters) {
     if (row.letter == letter) return row.options;
   }
-  return 0;
+  return PsColumnOption(letter);
 }
 
 // A number beyond 32 bits is no userspace's, and must not become another's.

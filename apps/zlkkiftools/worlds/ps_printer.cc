@@ -19,6 +19,62 @@ constexpr char kBranch[] = LINE_DRAWING("t") LINE_DRAWING("q");
 constexpr char kCorner[] = LINE_DRAWING("m") LINE_DRAWING("q");
 #undef LINE_DRAWING
 
+// What a width is counted from: nothing, the longest ID or the longest name.
+enum class Base : uint8_t { kNone, kIds, kNames };
+
+enum class Cell : uint8_t {
+  kWorldId,
+  kCartelId,
+  kName,
+  kChildren,
+  kThreads,
+  kGroup,
+  kProcessGroup,
+  kSession,
+  kParent,
+  kType,
+  kState,
+  kTime,
+  kSecurityDomain,
+  kUserspace,
+  kCommand,
+};
+
+}  // namespace
+
+// Without pointers, so that a start has nothing of it to relocate.
+struct PsColumn {
+  char letter;       // of the option that shows it; 0: it is always shown
+  PsOptions option;  // its bit
+  bool ofZombies;    // zombies have something in it, be it blanks
+  Base base;
+  int8_t headerFill;  // blanks behind the title, added to the base
+  int8_t width;       // of an ID's cell, added to the base
+  Cell cell;          // how it prints
+  char header[24];
+};
+
+namespace {
+
+constexpr PsColumn kColumns[] = {
+    {0, 0, true, Base::kIds, -3, 0, Cell::kWorldId, "WID"},
+    {0, 0, true, Base::kIds, -3, 0, Cell::kCartelId, "  CID"},
+    {0, 0, true, Base::kNames, -9, 0, Cell::kName, "  WorldName"},
+    {'n', PS_NCHILDREN, false, Base::kNone, 0, 0, Cell::kChildren, "  nChildren"},
+    {'N', PS_NTHREADS, false, Base::kNone, 0, 0, Cell::kThreads, "  nThreads"},
+    {'j', PS_GID, false, Base::kIds, -4, 0, Cell::kGroup, "  GID"},
+    {'g', PS_PGID_SID, true, Base::kIds, -5, -2, Cell::kProcessGroup, "  PGID"},
+    {'g', PS_PGID_SID, true, Base::kIds, -4, -2, Cell::kSession, "  SID"},
+    {'P', PS_PCID, true, Base::kIds, -4, 2, Cell::kParent, "  PCID"},
+    {'t', PS_TYPE, false, Base::kNone, 0, 0, Cell::kType, "  Type  "},
+    {'s', PS_STATE, true, Base::kNone, 0, 0, Cell::kState, "  State   Wait    CPU "},
+    {'T', PS_TIME, false, Base::kNone, 8, 0, Cell::kTime, "  Time"},
+    {'Z', PS_SECURITY_DOMAIN, false, Base::kNone, 0, 0, Cell::kSecurityDomain, "  SecurityDomain"},
+    {'U', PS_USERSPACE, false, Base::kNone, 0, 0, Cell::kUserspace, "  UserSpace"},
+    {'c', PS_COMMAND, false, Base::kNone, 0, 0, Cell::kCommand, "  Command"},
+};
+static_assert(sizeof(kColumns) / sizeof(kColumns[0]) == kPsColumns);
+
 // The state columns of a world without scheduler data.
 constexpr int kBlankState = 18;
 
@@ -61,12 +117,24 @@ void PrintNumber(int32_t number, int width) {
   Fill(width - printf("  %d", number));
 }
 
-void PrintFilled(const char *text, int fill) {
-  fputs(text, stdout);
-  Fill(fill);
+// The same for what a kernel world has none of.
+void PrintNumber(bool has, int32_t number, int width) {
+  if (has) {
+    PrintNumber(number, width);
+  } else {
+    fputs("  0", stdout);
+    Fill(width - 1);
+  }
 }
 
 }  // namespace
+
+PsOptions PsColumnOption(int letter) {
+  for (const PsColumn &column : kColumns) {
+    if (column.letter != 0 && column.letter == letter) return column.option;
+  }
+  return 0;
+}
 
 PsPrinter::PsPrinter(PsOptions options, const WorldTexts &texts)
     : options_(options),
@@ -74,79 +142,85 @@ PsPrinter::PsPrinter(PsOptions options, const WorldTexts &texts)
       idWidth_(snprintf(nullptr, 0, "%d", static_cast<int32_t>(maxWorldID))),
       nameWidth_(static_cast<int>(maxNameLength)),
       runStates_(CountStates(CpuSched_RunStateElements)),
-      waitStates_(CountStates(CpuSched_WaitStateElements)) {}
+      waitStates_(CountStates(CpuSched_WaitStateElements)) {
+  for (const PsColumn &column : kColumns) {
+    if (column.letter == 0 || Has(column.option)) shown_[shownCount_++] = &column;
+  }
+}
 
 void PsPrinter::PrintHeader() const {
   if (Has(PS_TREE)) fputs("  ", stdout);
-  PrintFilled("WID", idWidth_ - 3);
-  PrintFilled("  CID", idWidth_ - 3);
-  PrintFilled("  WorldName", nameWidth_ - 9);
-  if (Has(PS_NCHILDREN)) PrintFilled("  nChildren", 0);
-  if (Has(PS_NTHREADS)) PrintFilled("  nThreads", 0);
-  if (Has(PS_GID)) PrintFilled("  GID", idWidth_ - 4);
-  if (Has(PS_PGID_SID)) {
-    PrintFilled("  PGID", idWidth_ - 5);
-    PrintFilled("  SID", idWidth_ - 4);
+  for (size_t i = 0; i < shownCount_; ++i) {
+    const PsColumn &column = *shown_[i];
+    const int base = column.base == Base::kIds     ? idWidth_
+                     : column.base == Base::kNames ? nameWidth_
+                                                   : 0;
+    fputs(column.header, stdout);
+    Fill(base + column.headerFill);
   }
-  if (Has(PS_PCID)) PrintFilled("  PCID", idWidth_ - 4);
-  if (Has(PS_TYPE)) PrintFilled("  Type  ", 0);
-  if (Has(PS_STATE)) PrintFilled("  State   Wait    CPU ", 0);
-  if (Has(PS_TIME)) PrintFilled("  Time", 8);
-  if (Has(PS_SECURITY_DOMAIN)) PrintFilled("  SecurityDomain", 0);
-  if (Has(PS_USERSPACE)) PrintFilled("  UserSpace", 0);
-  if (Has(PS_COMMAND)) PrintFilled("  Command", 0);
   putchar('\n');
+}
+
+inline void PsPrinter::PrintCell(const PsColumn &column, const WorldRecord &record) const {
+  const int idWidth = idWidth_ + column.width;
+  const bool isUser = record.cartelID != 0;
+  switch (column.cell) {
+    case Cell::kWorldId:
+      return Fill(idWidth - printf("%d", static_cast<int32_t>(record.worldID)));
+    case Cell::kCartelId:
+      return PrintNumber(isUser, static_cast<int32_t>(record.cartelID), idWidth);
+    case Cell::kName: {
+      const char *name = record.isZombie ? "<zombie>" : texts_.At(record.name);
+      return Fill(nameWidth_ + 2 - printf("  %s", Shown(name).text()));
+    }
+    case Cell::kChildren:
+      printf("  %-9d", record.nChildren);
+      return;
+    case Cell::kThreads:
+      printf("  %-8d", record.nThreads);
+      return;
+    case Cell::kGroup:
+      return PrintNumber(record.groupID, idWidth);
+    case Cell::kProcessGroup:
+      return PrintNumber(isUser, record.processGroupID, idWidth);
+    case Cell::kSession:
+      return PrintNumber(isUser, record.sessionID, idWidth);
+    case Cell::kParent:
+      return PrintNumber(record.parentCartelID, idWidth);
+    case Cell::kType:
+      return PrintType(record.worldType);
+    case Cell::kState:
+      return PrintState(record);
+    case Cell::kTime:
+      if (!record.hasSchedStats) return;
+      printf("  %5llu.%06llu", static_cast<unsigned long long>(record.usedTime / 1000000),
+             static_cast<unsigned long long>(record.usedTime % 1000000));
+      return;
+    case Cell::kSecurityDomain:
+      printf("  %-14d", record.securityDomain);
+      return;
+    case Cell::kUserspace:
+      printf("  %-9d", static_cast<int32_t>(record.userspaceID));
+      return;
+    case Cell::kCommand:
+      if (!isUser) return;
+      Fill(2);
+      fputs(Shown(texts_.At(record.commandLine)).text(), stdout);
+  }
 }
 
 void PsPrinter::PrintRow(const WorldRecord &record) const {
-  const bool isWorld = !record.isZombie;
-  PrintIds(record);
-  if (Has(PS_NCHILDREN) && Has(PS_TREE) && isWorld) printf("  %-9d", record.nChildren);
-  if (Has(PS_NTHREADS) && Has(PS_TREE) && isWorld) printf("  %-8d", record.nThreads);
-  if (Has(PS_GID) && isWorld) PrintNumber(record.groupID, idWidth_);
-  if (Has(PS_PGID_SID)) PrintGroups(record);
-  if (Has(PS_PCID)) PrintNumber(record.parentCartelID, idWidth_ + 2);
-  if (Has(PS_TYPE) && isWorld) PrintType(record.worldType);
-  if (Has(PS_STATE)) PrintState(record);
-  if (Has(PS_TIME) && isWorld && record.hasSchedStats) {
-    printf("  %5llu.%06llu", static_cast<unsigned long long>(record.usedTime / 1000000),
-           static_cast<unsigned long long>(record.usedTime % 1000000));
+  for (size_t i = 0; i < shownCount_; ++i) {
+    if (!record.isZombie || shown_[i]->ofZombies) PrintCell(*shown_[i], record);
   }
-  if (Has(PS_SECURITY_DOMAIN) && isWorld) printf("  %-14d", record.securityDomain);
-  if (Has(PS_USERSPACE) && isWorld) printf("  %-9d", static_cast<int32_t>(record.userspaceID));
-  if (Has(PS_COMMAND) && isWorld && record.cartelID != 0) {
-    fputs("  ", stdout);
-    fputs(Shown(texts_.At(record.commandLine)).text(), stdout);
-  }
-  putchar('\n');
-}
-
-void PsPrinter::PrintIds(const WorldRecord &record) const {
-  Fill(idWidth_ - printf("%d", static_cast<int32_t>(record.worldID)));
-  if (record.cartelID != 0) {
-    PrintNumber(static_cast<int32_t>(record.cartelID), idWidth_);
-  } else {
-    PrintFilled("  0", idWidth_ - 1);
-  }
-  const char *name = record.isZombie ? "<zombie>" : texts_.At(record.name);
-  Fill(nameWidth_ + 2 - printf("  %s", Shown(name).text()));
-}
-
-void PsPrinter::PrintGroups(const WorldRecord &record) const {
-  if (record.cartelID != 0) {
-    PrintNumber(record.processGroupID, idWidth_ - 2);
-    PrintNumber(record.sessionID, idWidth_ - 2);
-  } else {
-    PrintFilled("  0", idWidth_ - 3);
-    PrintFilled("  0", idWidth_ - 3);
-  }
+  putchar_unlocked('\n');
 }
 
 void PsPrinter::PrintType(uint32_t worldType) const {
   constexpr int kLetterRoom = 6;
   int letters = 0;
   uint32_t rest = worldType;
-  fputs("  ", stdout);
+  Fill(2);
   do {
     const WorldKind *kind = FindKind(rest & -rest);
     if (kind == nullptr) {
@@ -157,7 +231,7 @@ void PsPrinter::PrintType(uint32_t worldType) const {
     if (Has(PS_VERBOSE)) {
       printf("%s%s", kind->name, rest != 0 ? "," : "");
     } else {
-      putchar(kind->letter);
+      putchar_unlocked(kind->letter);
       ++letters;
     }
   } while (rest != 0);
@@ -179,25 +253,14 @@ void PsPrinter::PrintState(const WorldRecord &record) const {
 // Below a record with a later sibling a line goes on down to that sibling. The root has none, and
 // what stands below it is only moved to the right.
 bool PsPrinter::PushBranch(const WorldRecord &record) {
-  if (branchesLength_ + sizeof(kVerticalLine) > branchesRoom_) {
-    const size_t room = branchesRoom_ > 0 ? branchesRoom_ * 2 : 4096;
-    void *grown = realloc(branches_.get(), room);
-    if (grown == nullptr) {
-      fputs("WorldList: Not enough memory\n", stderr);
-      return false;
-    }
-    (void)branches_.release();
-    branches_.reset(static_cast<char *>(grown));
-    branchesRoom_ = room;
-  }
   const std::string_view branch = BranchBelow(record);
-  memcpy(branches_.get() + branchesLength_, branch.data(), branch.size());
-  branchesLength_ += branch.size();
-  return true;
+  if (branches_.Append(branch.data(), branch.size())) return true;
+  fputs("WorldList: Not enough memory\n", stderr);
+  return false;
 }
 
 void PsPrinter::PopBranch(const WorldRecord &record) {
-  branchesLength_ -= BranchBelow(record).size();
+  branches_.Truncate(branches_.size() - BranchBelow(record).size());
 }
 
 // Walks by the records' links, so that the depth of a tree costs no stack.
@@ -206,7 +269,7 @@ bool PsPrinter::PrintTree(const WorldRecord &root) {
   printf("%d\n", static_cast<int32_t>(root.userspaceID));
   for (const WorldRecord *record = &root; record != nullptr;) {
     if (level > deepestLevel) deepestLevel = level;
-    fwrite_unlocked(branches_.get(), 1, branchesLength_, stdout);
+    fwrite_unlocked(branches_.text(), 1, branches_.size(), stdout);
     fputs(record->nextSibling != nullptr ? kBranch : kCorner, stdout);
     PrintRow(*record);
     if (record->firstChild != nullptr) {

@@ -4,10 +4,15 @@
 
 #include <stddef.h>
 
-#include <memory>
-
+#include "base/bytes.h"
 #include "worlds/ps_options.h"
 #include "worlds/world_record.h"
+
+struct PsColumn;
+constexpr size_t kPsColumns = 15;  // rows of the table of columns
+
+// The display option of the columns that an option letter shows; 0 where it shows none.
+PsOptions PsColumnOption(int letter);
 
 class PsPrinter {
  public:
@@ -25,14 +30,13 @@ class PsPrinter {
   bool PrintTree(const WorldRecord &root);
 
  private:
-  void PrintIds(const WorldRecord &record) const;
-  void PrintGroups(const WorldRecord &record) const;
+  void PrintCell(const PsColumn &column, const WorldRecord &record) const;
   void PrintType(uint32_t worldType) const;
   void PrintState(const WorldRecord &record) const;
   bool PushBranch(const WorldRecord &record);
   void PopBranch(const WorldRecord &record);
 
-  bool Has(PsOption option) const { return (options_ & option) != 0; }
+  bool Has(PsOptions option) const { return (options_ & option) != 0; }
 
   PsOptions options_;
   const WorldTexts &texts_;
@@ -40,9 +44,9 @@ class PsPrinter {
   int nameWidth_;
   uint32_t runStates_;
   uint32_t waitStates_;
+  const PsColumn *shown_[kPsColumns];  // in their order
+  size_t shownCount_ = 0;
 
   // What a row of the tree begins with: a branch for every level above it.
-  std::unique_ptr<char, FreeDeleter> branches_;
-  size_t branchesLength_ = 0;
-  size_t branchesRoom_ = 0;
+  Bytes branches_;
 };
