@@ -5,6 +5,12 @@
 install(TARGETS zlkkiftools kifcache RUNTIME DESTINATION bin)
 install(TARGETS zellibs LIBRARY DESTINATION lib)
 
+# To write other tools over hosts and recordings: the library's face in C, the records in C++.
+configure_file(packaging/zellibs.pc.in zellibs.pc @ONLY)
+install(FILES lib/zellibs/include/zellibs.h DESTINATION include/zellibs)
+install(DIRECTORY lib/records DESTINATION include/zellibs FILES_MATCHING PATTERN *.h)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zellibs.pc DESTINATION share/pkgconfig)
+
 # The tools' own names, in a directory of their own: they do not replace the system's ps or lspci.
 file(MAKE_DIRECTORY ${CMAKE_CURRENT_BINARY_DIR}/tools)
 foreach(tool ${ZLKKIFTOOLS_TOOLS})

@@ -16,3 +16,13 @@ for program in "$prefix"/bin/kifcache "$prefix"/lib/zlkkiftools/bin/*; do
 done
 "$prefix/bin/kifcache" --version >/dev/null
 "$prefix/lib/zlkkiftools/bin/uptime" | grep -q 'load average' || fail 'uptime does not run'
+
+# What others build on: the face in C, the records in C++.
+export PKG_CONFIG_LIBDIR=$prefix/share/pkgconfig
+read -ra flags <<<"$(pkg-config --define-prefix --cflags --libs zellibs)"
+echo 'int main(void) { return HostType_OSIsZLK(); }' >"$prefix/user.c"
+gcc -std=c99 -Wall -Wextra -Werror -include zellibs.h "$prefix/user.c" "${flags[@]}" -o "$prefix/user"
+LD_LIBRARY_PATH=$prefix/lib "$prefix/user" || fail 'a program in C finds another host'
+for records in "$prefix"/include/zellibs/records/*.h; do
+  g++ -std=c++20 -Werror -fsyntax-only -x c++ -include "$records" "${flags[@]}" /dev/null
+done
