@@ -7,6 +7,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <list>
 #include <regex>
 #include <set>
 #include <sstream>
@@ -339,10 +340,13 @@ void RegisterTranscript(const std::filesystem::path &path, const std::string &su
     for (char &c : text) c = isalnum(static_cast<unsigned char>(c)) ? c : '_';
     return text;
   };
-  auto *transcript = new Transcript{path, {}};
+  static std::list<Transcript> transcripts;  // of which the tests have parts
+  static std::list<Case> cases;
+  transcripts.push_back({path, {}});
+  Transcript *transcript = &transcripts.back();
   for (const Case &found : ReadTranscript(transcript)) {
     if (found.commands.empty()) continue;
-    const auto *one = new Case(found);
+    const Case *one = &cases.emplace_back(found);
     std::string name = word(path.stem());
     if (!found.name.empty()) name += "/" + word(found.name);
     while (!names.insert(name).second) name += "_";
