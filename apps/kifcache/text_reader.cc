@@ -1,59 +1,12 @@
 #include "text_reader.h"
 
-#include <stdarg.h>
-#include <stdio.h>
-
-#include <charconv>
 #include <cstring>
-#include <limits>
 
-#include "base/hex.h"
+#include "text_lexer.h"
 
 namespace {
 
 constexpr uint32_t kMostContent = uint32_t{64} << 20;  // of a content that is written out
-
-// A number as it is written: the 64 bits of it, and whether it stands below zero.
-struct Number {
-  uint64_t bits = 0;
-  bool negative = false;
-};
-
-bool ParseNumber(std::string_view word, Number *number) {
-  number->negative = word.starts_with('-');
-  if (number->negative) word.remove_prefix(1);
-  int base = 10;
-  if (word.starts_with("0x") || word.starts_with("0X")) {
-    word.remove_prefix(2);
-    base = 16;
-  }
-  const auto [end, error] =
-      std::from_chars(word.data(), word.data() + word.size(), number->bits, base);
-  if (word.empty() || error != std::errc() || end != word.data() + word.size()) return false;
-  if (!number->negative) return true;
-  if (number->bits > uint64_t{1} << 63) return false;
-  number->bits = 0 - number->bits;
-  return true;
-}
-
-// Whether the number's bits stand for it in a field of `size` bytes, with or without a sign.
-bool Fits(const Number &number, uint32_t size) {
-  const auto value = static_cast<int64_t>(number.bits);
-  if (number.negative) return size == 8 || value >= -(int64_t{1} << (size * 8 - 1));
-  return size == 8 || number.bits >> (size * 8) == 0;
-}
-
-bool ParseHex(std::string_view digits, std::string *bytes) {
-  if (digits.size() % 2 != 0) return false;
-  bytes->clear();
-  for (size_t i = 0; i < digits.size(); i += 2) {
-    const int high = HexDigit(digits[i]);
-    const int low = HexDigit(digits[i + 1]);
-    if (high < 0 || low < 0) return false;
-    bytes->push_back(static_cast<char>(high * 16 + low));
-  }
-  return true;
-}
 
 enum class PartType { kUnsigned, kSigned, kText, kHex };
 
@@ -76,10 +29,10 @@ constexpr TypeName kTypeNames[] = {
     {"hex", 0, PartType::kHex},
 };
 
-class Reader {
+class Reader : TextLexer {
  public:
   Reader(std::string_view text, const char *name, HostModel *model)
-      : rest_(text), name_(name), model_(model) {}
+      : TextLexer(text, name), model_(model) {}
 
   bool Read();
 
@@ -102,76 +55,16 @@ class Reader {
   bool FindPartByOffset(std::string_view name, Part *part);
   bool ReadPartText(const Part &part, std::string_view name, std::string *bytes);
   bool ReadPartNumber(const Part &part, std::string_view name, std::string *bytes);
-  bool ReadText(std::string *text);
-  bool ReadPlainText(std::string *text, const char *what);
-  bool ReadNumber(const char *what, Number *number);
-  bool ReadUnsigned32(const char *what, uint32_t *number);
   bool ReadEndOfLine();
 
-  // What stands next on the line. A word ends at a blank, or after a '=' inside it.
-  void SkipBlanks();
-  bool AtEnd() { return SkipBlanks(), line_.empty(); }
-  bool AtText() { return SkipBlanks(), line_.starts_with('"'); }
-  std::string_view NextWord(bool stopAtEquals);
-  bool TakeWord(std::string_view word);
-
-  bool Fail(const char *format, ...) __attribute__((format(printf, 2, 3)));
-
-  std::string_view rest_;
-  std::string_view line_;
-  uint32_t lineNumber_ = 0;
-  const char *name_;
   HostModel *model_;
   Values values_;
   Values entries_;
   std::string bytes_;
 };
 
-bool Reader::Fail(const char *format, ...) {
-  fprintf(stderr, "%s:%u: ", name_, lineNumber_);
-  va_list arguments;
-  va_start(arguments, format);
-  vfprintf(stderr, format, arguments);
-  va_end(arguments);
-  fputc('\n', stderr);
-  return false;
-}
-
-#define PRINTED(view) static_cast<int>((view).size() < 80 ? (view).size() : 80), (view).data()
-
-void Reader::SkipBlanks() {
-  const size_t start = line_.find_first_not_of(" \t");
-  line_.remove_prefix(start == line_.npos ? line_.size() : start);
-}
-
-std::string_view Reader::NextWord(bool stopAtEquals) {
-  SkipBlanks();
-  size_t end = line_.find_first_of(" \t");
-  if (end == line_.npos) end = line_.size();
-  if (stopAtEquals) {
-    const size_t equals = line_.find('=');
-    if (equals < end) end = equals + 1;
-  }
-  const std::string_view word = line_.substr(0, end);
-  line_.remove_prefix(end);
-  return word;
-}
-
-bool Reader::TakeWord(std::string_view word) {
-  const std::string_view before = line_;
-  if (NextWord(false) == word) return true;
-  line_ = before;
-  return false;
-}
-
 bool Reader::Read() {
-  while (!rest_.empty()) {
-    const size_t end = rest_.find('\n');
-    line_ = rest_.substr(0, end);
-    rest_.remove_prefix(end == rest_.npos ? rest_.size() : end + 1);
-    ++lineNumber_;
-    if (line_.ends_with('\r')) line_.remove_suffix(1);
-    if (AtEnd() || line_.starts_with('#')) continue;
+  while (NextLine()) {
     if (!ReadLine() || !ReadEndOfLine()) return false;
   }
   uint32_t firstLine = 0;
@@ -259,58 +152,6 @@ bool Reader::ReadValue(Value *value) {
     return Fail("\"%.*s\" is no integer, text or null", PRINTED(word));
   }
   return true;
-}
-
-bool Reader::ReadNumber(const char *what, Number *number) {
-  const std::string_view word = NextWord(false);
-  return ParseNumber(word, number) || Fail("%s \"%.*s\" is no number", what, PRINTED(word));
-}
-
-bool Reader::ReadUnsigned32(const char *what, uint32_t *number) {
-  Number parsed;
-  if (!ReadNumber(what, &parsed)) return false;
-  if (parsed.negative || !Fits(parsed, 4)) return Fail("%s is out of range", what);
-  *number = static_cast<uint32_t>(parsed.bits);
-  return true;
-}
-
-// Reads a text in quotes.
-bool Reader::ReadText(std::string *text) {
-  text->clear();
-  if (!AtText()) return Fail("a text in double quotes is missing");
-  for (size_t i = 1; i < line_.size(); ++i) {
-    if (line_[i] == '"') {
-      line_.remove_prefix(i + 1);
-      if (!line_.empty() && line_[0] != ' ' && line_[0] != '\t') {
-        return Fail("a text ends before \"%.*s\"", PRINTED(line_));
-      }
-      return true;
-    }
-    if (line_[i] != '\\') {
-      text->push_back(line_[i]);
-      continue;
-    }
-    constexpr char kLetters[] = "\"\\ntr";
-    constexpr char kMeant[] = "\"\\\n\t\r";
-    const char letter = ++i < line_.size() ? line_[i] : '\0';
-    const char *found = letter != '\0' ? strchr(kLetters, letter) : nullptr;
-    std::string byte;
-    if (found != nullptr) {
-      text->push_back(kMeant[found - kLetters]);
-    } else if (letter == 'x' && i + 2 < line_.size() && ParseHex(line_.substr(i + 1, 2), &byte)) {
-      text->append(byte);
-      i += 2;
-    } else {
-      return Fail("a backslash stands before \", \\, n, t, r or xHH only");
-    }
-  }
-  return Fail("a text has no closing quote");
-}
-
-// Reads a text that cannot hold a NUL.
-bool Reader::ReadPlainText(std::string *text, const char *what) {
-  if (!ReadText(text)) return false;
-  return text->find('\0') == text->npos || Fail("a %s cannot hold a NUL", what);
 }
 
 bool Reader::ReadList() {
