@@ -2,60 +2,12 @@
 
 #include <cstring>
 
-#include <errno.h>
-#include <fcntl.h>
-#include <sys/mman.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include "status.h"
 
 namespace {
 
-constexpr size_t kLeastSize = 8;  // the root's place and the identifier
-
-KIF_Status StatusOfOpen(int error) {
-  switch (error) {
-    case ENOENT:
-    case ENOTDIR:
-    case ENAMETOOLONG:
-    case ELOOP:
-      return KIF_STATUS_NO_CACHE_FILE;
-    default:
-      return StatusOfErrno(error);
-  }
-}
-
-// Maps the file behind `descriptor`, which may be anything.
-KIF_Status Map(int descriptor, CacheFile *file) {
-  struct stat status;
-  if (fstat(descriptor, &status) != 0) return StatusOfErrno(errno);
-  if (!S_ISREG(status.st_mode) || status.st_size < static_cast<off_t>(kLeastSize)) {
-    return KIF_STATUS_NOT_A_CACHE_FILE;
-  }
-  if (static_cast<uint64_t>(status.st_size) >= FLATBUFFERS_MAX_BUFFER_SIZE) {
-    return KIF_STATUS_NOT_A_CACHE_FILE;
-  }
-  file->size = static_cast<size_t>(status.st_size);
-  void *map = mmap(nullptr, file->size, PROT_READ, MAP_PRIVATE, descriptor, 0);
-  if (map == MAP_FAILED) return StatusOfErrno(errno);
-  file->map = static_cast<const uint8_t *>(map);
-  return KIF_STATUS_OK;
-}
-
-KIF_Status OpenAndMap(const char *path, CacheFile *file) {
-  // Opening a device may do something, and opening a FIFO waits: neither is opened.
-  struct stat status;
-  if (stat(path, &status) != 0) return StatusOfOpen(errno);
-  if (!S_ISREG(status.st_mode)) return KIF_STATUS_NOT_A_CACHE_FILE;
-  const int descriptor = open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY);
-  if (descriptor == -1) return StatusOfOpen(errno);
-  const KIF_Status result = Map(descriptor, file);
-  close(descriptor);
-  return result;
-}
-
 KIF_Status ReadVersion(const CacheFile &file) {
+  if (IsGzip({file.map, file.size})) return KIF_STATUS_COMPRESSED_CACHE_FILE;
   if (!flatbuffers::BufferHasIdentifier(file.map, cache::FileIdentifier())) {
     return KIF_STATUS_NOT_A_CACHE_FILE;
   }
@@ -106,20 +58,26 @@ KIF_Status Verify(CacheFile *file) {
 }  // namespace
 
 KIF_Status OpenCacheFile(const char *path, CacheFile *file) {
-  CacheFile opened = {};
+  FileBytes bytes = {};
   if (path == nullptr) return KIF_STATUS_BAD_PARAMETER;
-  KIF_Status status = OpenAndMap(path, &opened);
-  if (status == KIF_STATUS_OK) status = Verify(&opened);
-  if (status == KIF_STATUS_OK) {
-    *file = opened;
-  } else {
-    CloseCacheFile(&opened);
-  }
+  KIF_Status status = OpenFileBytes(path, &bytes);
+  if (status == KIF_STATUS_OK) status = OpenCacheBytes(bytes, file);
+  if (status != KIF_STATUS_OK) ReleaseFileBytes(&bytes);
+  return status;
+}
+
+KIF_Status OpenCacheBytes(const FileBytes &bytes, CacheFile *file) {
+  CacheFile opened = {};
+  opened.map = bytes.map;
+  opened.size = bytes.size;
+  const KIF_Status status = Verify(&opened);
+  if (status == KIF_STATUS_OK) *file = opened;
   return status;
 }
 
 void CloseCacheFile(CacheFile *file) {
-  if (file->map != nullptr) munmap(const_cast<uint8_t *>(file->map), file->size);
+  FileBytes bytes = {file->map, file->size};
+  ReleaseFileBytes(&bytes);
   *file = {};
 }
 

@@ -7,6 +7,7 @@
 #include <cstdint>
 
 #include "cache_generated.h"
+#include "file_bytes.h"
 #include "nodes.h"
 #include "zellibs.h"
 
@@ -25,10 +26,14 @@ struct CacheFile {
   uint32_t byteCount;
 };
 
-// Opens the cache file at `path`. The status tells apart: no such file, no permission, not a cache
-// file (nor any other kind of file), damaged, and of another major version. `*file` is written only
-// when it is KIF_STATUS_OK; CloseCacheFile releases it.
+// Opens the cache file at `path`, or on standard input under that one's name (file_bytes.h). The
+// status tells apart: no such file, no permission, not a cache file (nor any other kind of file),
+// compressed, damaged, and of another major version. `*file` is written only when it is
+// KIF_STATUS_OK; CloseCacheFile releases it.
 KIF_Status OpenCacheFile(const char *path, CacheFile *file);
+
+// As above, of bytes that are there already; they are the file's when the status is KIF_STATUS_OK.
+KIF_Status OpenCacheBytes(const FileBytes &bytes, CacheFile *file);
 void CloseCacheFile(CacheFile *file);
 
 // Whether a run of parameters or bytes lies within the file.

@@ -27,6 +27,8 @@ constexpr StatusText kTexts[] = {
     {KIF_STATUS_NOT_A_CACHE_FILE, "Not a cache file"},
     {KIF_STATUS_DAMAGED_CACHE_FILE, "Damaged cache file"},
     {KIF_STATUS_CACHE_VERSION, "Cache file of another version"},
+    {KIF_STATUS_COMPRESSED_CACHE_FILE,
+     "Compressed cache file: gzip -d it, or zcat FILE | zlkkiftools -c /dev/stdin ps"},
     {KIF_STATUS_NO_COMMAND_LINE, "No command line"},
 };
 

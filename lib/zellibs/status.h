@@ -18,6 +18,7 @@
 #define KIF_STATUS_NOT_A_CACHE_FILE 0xbad0042u
 #define KIF_STATUS_DAMAGED_CACHE_FILE 0xbad0043u
 #define KIF_STATUS_CACHE_VERSION 0xbad0044u
+#define KIF_STATUS_COMPRESSED_CACHE_FILE 0xbad0045u
 #define KIF_STATUS_NO_COMMAND_LINE 0xbad0062u
 
 // The status for a failed system call: gone (ENOENT, ESRCH, ENODEV, ENXIO) is not found, EACCES and
