@@ -408,6 +408,17 @@ void TellOfMachine(Facts *facts) {
   facts->rights = geteuid() == 0 ? "root" : "user " + std::to_string(geteuid());
 }
 
+// Whether the host can be asked at all. A world that no host has is refused or not found; any other
+// answer says what is wrong with the host itself, such as a file that is none.
+KIF_Status StatusOfHost() {
+  const ParamListHandle nobody = ListOf({IntegerValue(-1), IntegerValue(-1)});
+  const uint32_t size = kNodes[kNode_world_info].offers.recordSize;
+  std::string record(size, '\0');
+  const KIF_Status status = KIF_Get(KIF_NODE_world_info, nobody.get(), record.data(), size);
+  const bool isAnswer = status == KIF_STATUS_NOT_FOUND || status == KIF_STATUS_BAD_PARAMETER;
+  return isAnswer || HostType_OSIsZLK() ? KIF_STATUS_OK : status;
+}
+
 }  // namespace
 
 bool RecordHost(const RecordOptions &options, HostModel *model) {
@@ -418,7 +429,8 @@ bool RecordHost(const RecordOptions &options, HostModel *model) {
   ZlkSyscall_Init(1, 0, 0);
   char date[sizeof(kInterfaceDate)] = "";
   const char *libraryDate = "";
-  const KIF_Status status = KIF_CheckSig(date, sizeof(date), &libraryDate);
+  KIF_Status status = KIF_CheckSig(date, sizeof(date), &libraryDate);
+  if (status == 0) status = StatusOfHost();
   if (status != 0) {
     fprintf(stderr, "kifcache: the host cannot be recorded: %s\n",
             ZLK_ReturnStatusToString(status));

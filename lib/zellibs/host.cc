@@ -1,8 +1,10 @@
 #include "host.h"
 
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
+#include "printable/printable.h"
 #include "status.h"
 
 namespace {
@@ -19,8 +21,12 @@ Choice choice;
 constexpr char kLinux[] = "linux";
 constexpr size_t kLinuxLength = sizeof(kLinux) - 1;
 
+const char *HostName() {
+  return getenv("ZELLIBS_HOST");
+}
+
 Choice ChooseByEnvironment() {
-  const char *name = getenv("ZELLIBS_HOST");
+  const char *name = HostName();
   if (name == nullptr || name[0] == '\0' || strcmp(name, kLinux) == 0) {
     return {true, true, KIF_STATUS_OK, &kLinuxHost};
   }
@@ -51,6 +57,19 @@ KIF_Status CurrentHost(const Host **host) {
 
 bool HasLiveHost() {
   return Chosen().live;
+}
+
+bool TellOfUnusableHost() {
+  if (!Chosen().live || Chosen().status == KIF_STATUS_OK) return false;
+  const char *name = HostName();
+  // A file may be called anything, such as a line of a log.
+  char line[4096];
+  const int length = snprintf(line, sizeof(line), "libzellibs.so: ZELLIBS_HOST: %s: %s",
+                              name != nullptr ? name : "", ZLK_ReturnStatusToString(choice.status));
+  const size_t size = static_cast<size_t>(length);
+  printable::MaskControls(line, size < sizeof(line) ? size : sizeof(line) - 1);
+  fprintf(stderr, "%s\n", line);
+  return true;
 }
 
 KIF_Status UseRecordedHost(const char *path) {

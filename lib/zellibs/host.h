@@ -41,6 +41,10 @@ KIF_Status CurrentHost(const Host **host);
 // Whether there is a host to be live on, be it one that cannot be read.
 bool HasLiveHost();
 
+// Whether the live host is one that cannot be read, a file that is none; says so on standard error
+// in a line: file and reason. Such a name is mostly mistyped.
+bool TellOfUnusableHost();
+
 // Makes the cache file `path` the host; on failure the host stays what it was.
 KIF_Status UseRecordedHost(const char *path);
 
