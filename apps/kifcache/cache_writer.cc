@@ -8,7 +8,7 @@
 #include <unordered_set>
 
 #include "cache_file.h"
-#include "replace_file.h"
+#include "output.h"
 
 namespace {
 
@@ -183,5 +183,5 @@ bool WriteCacheFile(const HostModel &model, const char *path) {
   const auto checksum = static_cast<uint32_t>(crc32_z(0, content.data(), content.size()));
   cache::FinishFileBuffer(builder, cache::CreateFile(builder, kCacheMajorVersion,
                                                      kCacheMinorVersion, checksum, contentAt));
-  return ReplaceFile(path, builder.GetBufferPointer(), builder.GetSize());
+  return WriteRecording(path, builder.GetBufferPointer(), builder.GetSize());
 }

@@ -1,6 +1,7 @@
 // kifcache: makes, shows and checks the files that hold a recorded host.
 #include <errno.h>
 #include <fcntl.h>
+#include <signal.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <unistd.h>
@@ -9,14 +10,15 @@
 #include <new>
 #include <string>
 
-#include "cache_file.h"
 #include "cache_writer.h"
 #include "check.h"
 #include "command_line.h"
 #include "host_model.h"
+#include "input.h"
 #include "json_writer.h"
 #include "messages.h"
 #include "node_table.h"
+#include "output.h"
 #include "recorder.h"
 #include "status.h"
 #include "text_reader.h"
@@ -24,28 +26,9 @@
 
 namespace {
 
-class OpenFile {
- public:
-  explicit OpenFile(const char *path) : status_(OpenCacheFile(path, &file_)) {
-    if (status_ != 0) {
-      Complain(path, ZLK_ReturnStatusToString(status_));
-    }
-  }
-  ~OpenFile() { CloseCacheFile(&file_); }
-  OpenFile(const OpenFile &) = delete;
-  OpenFile &operator=(const OpenFile &) = delete;
-
-  bool isOpen() const { return status_ == 0; }
-  const CacheFile &file() const { return file_; }
-
- private:
-  CacheFile file_ = {};
-  KIF_Status status_;
-};
-
 // Reads the whole file, or standard input for "-".
 bool ReadFile(const char *path, std::string *bytes) {
-  const bool isInput = strcmp(path, "-") == 0;
+  const bool isInput = IsStandardStream(path);
   const int descriptor = isInput ? STDIN_FILENO : open(path, O_RDONLY | O_CLOEXEC);
   int error = errno;
   ssize_t count = descriptor == -1 ? -1 : 1;
@@ -56,7 +39,7 @@ bool ReadFile(const char *path, std::string *bytes) {
     if (count > 0) bytes->append(block, static_cast<size_t>(count));
   }
   if (!isInput && descriptor != -1) close(descriptor);
-  if (count < 0) Complain(path, strerror(error));
+  if (count < 0) Complain(InputName(path), strerror(error));
   return count == 0;
 }
 
@@ -65,41 +48,51 @@ constexpr Option kRedact = {
 constexpr Option kJson = {"json", nullptr, "as JSON Lines"};
 
 int Record(const Arguments &given) {
+  const char *path = given.operands[0];
   HostModel model;
-  const RecordOptions options = {given.Has(kRedact), isatty(STDERR_FILENO) == 1};
-  return RecordHost(options, &model) && WriteCacheFile(model, given.operands[0]) ? 0 : 1;
+  if (!MayWriteRecording(path) || !RecordHost({given.Has(kRedact)}, &model)) return 1;
+  return WriteCacheFile(model, path) ? 0 : 1;
 }
 
 int Check(const Arguments &given) {
-  const OpenFile open(given.operands[0]);
-  return open.isOpen() && CheckFile(given.operands[0], open.file(), stdout) ? 0 : 1;
+  const char *path = given.operands[0];
+  const InputRecording input(path);
+  return input.isOpen() && CheckFile(InputName(path), input.file(), stdout) ? 0 : 1;
 }
 
 int Dump(const Arguments &given) {
   const char *path = given.operands[0];
-  const OpenFile open(path);
-  if (!open.isOpen()) return 1;
+  const InputRecording input(path);
+  if (!input.isOpen()) return 1;
   TextWriter textWriter(stdout);
   JsonWriter jsonWriter(stdout);
   Visitor *writer = given.Has(kJson) ? static_cast<Visitor *>(&jsonWriter) : &textWriter;
   std::string problem;
-  if (VisitAll(open.file(), writer, &problem)) return 0;
-  Complain(path, ZLK_ReturnStatusToString(KIF_STATUS_DAMAGED_CACHE_FILE));
+  if (VisitAll(input.file(), writer, &problem)) return 0;
+  Complain(InputName(path), ZLK_ReturnStatusToString(KIF_STATUS_DAMAGED_CACHE_FILE));
   return 1;
 }
 
 int Build(const Arguments &given) {
   const char *textPath = given.operands[0];
+  const char *path = given.operands[1];
   std::string text;
-  if (!ReadFile(textPath, &text)) return 1;
+  if (!MayWriteRecording(path) || !ReadFile(textPath, &text)) return 1;
   HostModel model;
-  const char *name = strcmp(textPath, "-") == 0 ? "(standard input)" : textPath;
-  return ReadText(text, name, &model) && WriteCacheFile(model, given.operands[1]) ? 0 : 1;
+  const char *name = IsStandardStream(textPath) ? "(standard input)" : textPath;
+  return ReadText(text, name, &model) && WriteCacheFile(model, path) ? 0 : 1;
 }
 
 int Nodes(const Arguments &) {
   PrintNodes(stdout);
   return 0;
+}
+
+// A file that is opened must not take the place of a closed standard stream and get its output.
+void OccupyStandardStreams() {
+  for (int stream = STDIN_FILENO; stream <= STDERR_FILENO; ++stream) {
+    if (fcntl(stream, F_GETFD) == -1) (void)open("/", O_PATH | O_CLOEXEC);
+  }
 }
 
 int Version() {
@@ -133,6 +126,8 @@ const Command kCommands[] = {
 
 int main(int argc, char **argv) {
   EndWhenOutOfMemory();
+  OccupyStandardStreams();
+  signal(SIGXFSZ, SIG_IGN);  // a file size limit is an error like a full disk
   const bool asksVersion = argc == 2 && strcmp(argv[1], "--version") == 0;
   const int status = asksVersion ? Version() : RunCommandLine(argc, argv);
   const bool failedBefore = ferror(stdout) != 0;

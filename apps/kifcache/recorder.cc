@@ -12,6 +12,7 @@
 #include <set>
 
 #include "kif/kif.h"
+#include "progress.h"
 #include "records/platform.h"
 #include "records/worlds.h"
 #include "redact.h"
@@ -129,7 +130,7 @@ class Recorder {
   std::vector<Values> instances_[kNodeCount];
   std::set<Values> cartelsOfWorlds_;
   uint64_t omitted_[kNodeCount] = {};
-  uint64_t answers_ = 0;
+  Progress progress_{"answers"};
 };
 
 void Recorder::Record() {
@@ -151,17 +152,13 @@ void Recorder::Record() {
 
 // Whether there is room for another answer; those that find none are counted.
 bool Recorder::HasRoom(const NodeInfo &node) {
-  constexpr uint64_t kAnswersPerStep = 1024;
-  if (options_.progress && answers_++ % kAnswersPerStep == 0) {
-    fprintf(stderr, "\rkifcache: %" PRIu64 " answers, %.50s\033[K", answers_ - 1, node.path);
-  }
+  progress_.Step(node.path);
   if (model_->size() < kMostRecorded) return true;
   ++omitted_[IndexOf(node)];
   return false;
 }
 
 void Recorder::TellOmitted() {
-  if (options_.progress) fputs("\r\033[K", stderr);
   for (const NodeInfo &node : kNodes) {
     const uint64_t count = omitted_[IndexOf(node)];
     if (count == 0) continue;

@@ -5,8 +5,7 @@
 #include "host_model.h"
 
 struct RecordOptions {
-  bool redact = false;    // leave the arguments of command lines and the values of boot options out
-  bool progress = false;  // keep a line on standard error up to date
+  bool redact = false;  // leave the arguments of command lines and the values of boot options out
 };
 
 // Walks every node of the host into `model`, which is empty before and sorted after. Answers are

@@ -58,7 +58,6 @@ bool ReplaceFile(const char *path, const void *bytes, size_t size) {
   }
   std::string temporary = std::string(path) + ".XXXXXX";
   const SignalsHeld held;
-  signal(SIGXFSZ, SIG_IGN);  // a file size limit is an error like a full disk
   const int descriptor = mkostemp(temporary.data(), O_CLOEXEC);  // mode 0600
   if (descriptor == -1) return Fail(path, errno);
   int error = WriteAll(descriptor, bytes, size);

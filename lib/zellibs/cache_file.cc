@@ -67,6 +67,7 @@ KIF_Status OpenCacheFile(const char *path, CacheFile *file) {
 }
 
 KIF_Status OpenCacheBytes(const FileBytes &bytes, CacheFile *file) {
+  if (bytes.size < kLeastFileBytes) return KIF_STATUS_NOT_A_CACHE_FILE;
   CacheFile opened = {};
   opened.map = bytes.map;
   opened.size = bytes.size;

@@ -14,7 +14,6 @@
 
 namespace {
 
-constexpr size_t kLeastSize = 8;  // the root's place and the identifier
 constexpr size_t kFirstRead = size_t{1} << 16;
 
 KIF_Status StatusOfOpen(int error) {
@@ -30,12 +29,12 @@ KIF_Status StatusOfOpen(int error) {
 }
 
 bool MayBeRecording(const FileBytes &bytes) {
-  return bytes.size < kLeastSize || IsGzip(bytes) ||
+  return bytes.size < kLeastFileBytes || IsGzip(bytes) ||
          flatbuffers::BufferHasIdentifier(bytes.map, cache::FileIdentifier());
 }
 
 KIF_Status Map(int descriptor, const struct stat &status, FileBytes *bytes) {
-  if (status.st_size < static_cast<off_t>(kLeastSize) ||
+  if (status.st_size < static_cast<off_t>(kLeastFileBytes) ||
       static_cast<uint64_t>(status.st_size) > kMostFileBytes) {
     return KIF_STATUS_NOT_A_CACHE_FILE;
   }
@@ -72,7 +71,7 @@ KIF_Status ReadInto(int descriptor, FileBytes *room, size_t *size) {
     if (*size > kMostFileBytes) return KIF_STATUS_TOO_LARGE;
     if (count == 0 || !MayBeRecording({room->map, *size})) break;
   }
-  return *size < kLeastSize ? KIF_STATUS_NOT_A_CACHE_FILE : KIF_STATUS_OK;
+  return *size > 0 ? KIF_STATUS_OK : KIF_STATUS_NOT_A_CACHE_FILE;
 }
 
 KIF_Status ReadAll(int descriptor, FileBytes *bytes) {

@@ -15,6 +15,8 @@ struct FileBytes {
 // A place in a recording is a 32-bit number, of which FlatBuffers keeps one bit.
 constexpr size_t kMostFileBytes = 0x7ffffffe;
 
+constexpr size_t kLeastFileBytes = 8;  // the root's place and the identifier
+
 // The name of standard input, whatever is behind it.
 constexpr char kStandardInput[] = "/dev/stdin";
 
