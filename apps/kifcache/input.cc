@@ -1,5 +1,7 @@
 #include "input.h"
 
+#include <errno.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -12,6 +14,9 @@
 #include "status.h"
 
 namespace {
+
+// A text takes more than its recording.
+constexpr size_t kMostText = 2 * kMostFileBytes;
 
 std::string_view View(const FileBytes &bytes) {
   return {reinterpret_cast<const char *>(bytes.map), bytes.size};
@@ -110,4 +115,18 @@ bool IsStandardStream(const char *path) {
 
 const char *InputName(const char *path) {
   return IsStandardStream(path) ? "standard input" : path;
+}
+
+bool InputText::Read(const char *path) {
+  const bool isInput = IsStandardStream(path);
+  const int descriptor = isInput ? STDIN_FILENO : open(path, O_RDONLY | O_CLOEXEC);
+  const int error = descriptor == -1 ? errno : read_.ReadAll(descriptor, kMostText);
+  if (!isInput && descriptor != -1) close(descriptor);
+  if (error != 0) return Complain(InputName(path), strerror(error));
+  const FileBytes bytes = {reinterpret_cast<const uint8_t *>(read_.text()), read_.size()};
+  const char *problem = IsGzip(bytes) ? Gunzip(bytes, &expanded_) : nullptr;
+  if (problem != nullptr) return Complain(InputName(path), problem);
+  if (text().size() < kLeastFileBytes || text().substr(4, 4) != cache::FileIdentifier())
+    return true;
+  return Complain(InputName(path), "a recording, and no text: kifcache dump prints one");
 }

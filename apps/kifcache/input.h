@@ -1,6 +1,9 @@
-// The recordings that a command reads: files, or standard input for "-".
+// What a command reads: recordings and texts in files, or standard input for "-".
 #pragma once
 
+#include <string_view>
+
+#include "base/bytes.h"
 #include "cache_file.h"
 
 // An open recording, expanded where it is compressed.
@@ -18,6 +21,27 @@ class InputRecording {
  private:
   CacheFile file_ = {};
   bool isOpen_;
+};
+
+// A text that somebody wrote, or standard input for "-", expanded where it is compressed.
+class InputText {
+ public:
+  InputText() = default;
+  ~InputText() { ReleaseFileBytes(&expanded_); }
+  InputText(const InputText &) = delete;
+  InputText &operator=(const InputText &) = delete;
+
+  // False after a message.
+  bool Read(const char *path);
+
+  std::string_view text() const {
+    if (expanded_.map == nullptr) return {read_.text(), read_.size()};
+    return {reinterpret_cast<const char *>(expanded_.map), expanded_.size};
+  }
+
+ private:
+  Bytes read_;
+  FileBytes expanded_ = {};
 };
 
 // Whether a path is the one for standard input and output.

@@ -26,23 +26,6 @@
 
 namespace {
 
-// Reads the whole file, or standard input for "-".
-bool ReadFile(const char *path, std::string *bytes) {
-  const bool isInput = IsStandardStream(path);
-  const int descriptor = isInput ? STDIN_FILENO : open(path, O_RDONLY | O_CLOEXEC);
-  int error = errno;
-  ssize_t count = descriptor == -1 ? -1 : 1;
-  while (count > 0) {
-    char block[1 << 16];
-    count = read(descriptor, block, sizeof(block));
-    error = errno;
-    if (count > 0) bytes->append(block, static_cast<size_t>(count));
-  }
-  if (!isInput && descriptor != -1) close(descriptor);
-  if (count < 0) Complain(InputName(path), strerror(error));
-  return count == 0;
-}
-
 constexpr Option kRedact = {
     "redact", nullptr, "without the arguments of command lines and the values of boot options"};
 constexpr Option kJson = {"json", nullptr, "as JSON Lines"};
@@ -76,11 +59,11 @@ int Dump(const Arguments &given) {
 int Build(const Arguments &given) {
   const char *textPath = given.operands[0];
   const char *path = given.operands[1];
-  std::string text;
-  if (!MayWriteRecording(path) || !ReadFile(textPath, &text)) return 1;
+  InputText input;
+  if (!MayWriteRecording(path) || !input.Read(textPath)) return 1;
   HostModel model;
   const char *name = IsStandardStream(textPath) ? "(standard input)" : textPath;
-  return ReadText(text, name, &model) && WriteCacheFile(model, path) ? 0 : 1;
+  return ReadText(input.text(), name, &model) && WriteCacheFile(model, path) ? 0 : 1;
 }
 
 int Nodes(const Arguments &) {

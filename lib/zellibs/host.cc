@@ -4,7 +4,7 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "printable/printable.h"
+#include "base/utf8.h"
 #include "status.h"
 
 namespace {
@@ -67,7 +67,7 @@ bool TellOfUnusableHost() {
   const int length = snprintf(line, sizeof(line), "libzellibs.so: ZELLIBS_HOST: %s: %s",
                               name != nullptr ? name : "", ZLK_ReturnStatusToString(choice.status));
   const size_t size = static_cast<size_t>(length);
-  printable::MaskControls(line, size < sizeof(line) ? size : sizeof(line) - 1);
+  MaskControls(line, size < sizeof(line) ? size : sizeof(line) - 1);
   fprintf(stderr, "%s\n", line);
   return true;
 }
