@@ -173,6 +173,27 @@ std::string HostTest::Link(const std::string &path) {
   return link.string();
 }
 
+std::string HostTest::ProgramsForAnyone() {
+  namespace fs = std::filesystem;
+  const fs::path programs = fs::path(scratch_) / ".programs";
+  const auto how = fs::copy_options::recursive | fs::copy_options::copy_symlinks |
+                   fs::copy_options::skip_existing;
+  std::error_code exists;
+  fs::create_directory(programs);
+  fs::copy(BIN_DIR, programs / "bin", how, exists);
+  fs::copy(LIB_DIR, programs / "lib", how, exists);
+  const auto open = fs::perms::owner_all | fs::perms::group_all | fs::perms::others_all;
+  fs::permissions(scratch_, open);
+  for (const fs::path &folder : {programs, programs / "bin", programs / "lib"}) {
+    fs::permissions(folder, open);
+  }
+  for (const char *file : {"bin/zlkkiftools", "lib/libzellibs.so"}) {
+    fs::permissions(programs / file, fs::perms::others_read | fs::perms::others_exec,
+                    fs::perm_options::add);
+  }
+  return (programs / "bin").string();
+}
+
 std::string HostTest::WriteFile(const std::string &path, const std::string &bytes) {
   const std::filesystem::path file = std::filesystem::path(scratch_) / path;
   std::filesystem::create_directories(file.parent_path());

@@ -50,11 +50,15 @@ class HostTest : public testing::Test {
   //   FAULT_INJECT   makes calls of the program fail (fault/fault.h)
   //   HWDATA_FOLDER  gives it PCI ID files from the folder that the variable HWDATA_FOLDER names,
   //                  in place of those in /usr/share/hwdata (pci/pci_ids_test.cc)
+  //   OWN_SIGNALS    lets it signal no process but those of the test (worlds/own_signals.cc)
   //   LSTAT_DEVICE   makes files look like those of the in-memory file system (fsstats/)
   std::string Preload(const std::string &library) { return Link(library); }
 
   // A link to a file or folder, by a path without blanks, colons or other signs.
   std::string Link(const std::string &path);
+
+  // A folder with copies of the programs that every user may run, wherever the checkout lies.
+  std::string ProgramsForAnyone();
 
   // Writes a file below the scratch folder, with the folders it needs, and gives its path.
   std::string WriteFile(const std::string &path, const std::string &bytes);

@@ -1,5 +1,5 @@
 // Every tool where little is to be had: a full disk or nothing at all behind its streams, few
-// descriptors, no /proc, another user's processes, an empty host, processes that come and go.
+// descriptors, another user's processes, an empty host, processes that come and go.
 #include <dirent.h>
 #include <fcntl.h>
 #include <signal.h>
@@ -13,18 +13,13 @@
 
 namespace {
 
-bool IsHarmlessHere(const Command &command) {
-  const std::string &tool = command.arguments[0];
-  return tool != "pkill" && tool != "mdu" && !(tool == "hwclock" && command.arguments.size() > 1);
-}
-
 class SurroundingsTest : public HostTest {
  protected:
   // Runs a command line through a shell that prepares the process: `script` ends with exec "$@".
   Outcome Prepared(const std::string &script, const std::vector<std::string> &arguments,
                    const std::string &host, const std::vector<std::string> &before = {}) {
     std::vector<std::string> commandLine = before;
-    commandLine.insert(commandLine.end(), {"sh", "-c", script, "sh", BIN_DIR "/zlkkiftools"});
+    commandLine.insert(commandLine.end(), {"sh", "-c", script, "sh", programs_ + "/zlkkiftools"});
     commandLine.insert(commandLine.end(), arguments.begin(), arguments.end());
     const Outcome outcome = Run(commandLine, {.environment = {"ZELLIBS_HOST=" + host}});
     const std::string what = Describe(arguments) + " after " + script + "\n" + outcome.err;
@@ -40,6 +35,8 @@ class SurroundingsTest : public HostTest {
       if (IsHarmlessHere(command)) Prepared(script, command.arguments, "linux", before);
     }
   }
+
+  std::string programs_ = BIN_DIR;
 
   // Whether a command that prepares the surroundings may do so here.
   bool Can(std::vector<std::string> command) {
@@ -95,33 +92,11 @@ TEST_F(SurroundingsTest, EmptyHost) {
   }
 }
 
-TEST_F(SurroundingsTest, NoProc) {
-#if defined(__SANITIZE_ADDRESS__)
-  GTEST_SKIP() << "the sanitizer itself reads /proc";
-#endif
-  const std::vector<std::string> unshared = {"unshare", "-rm"};
-  if (!Can(unshared)) GTEST_SKIP() << "no mount namespaces for this user";
-  // Without /proc the loader cannot tell where the program stands.
-  OnThisMachine("mount -t tmpfs none /proc && LD_LIBRARY_PATH=\"$LIB_DIR\" exec \"$@\"", unshared);
-  OnThisMachine("mount -t tmpfs none /sys && exec \"$@\"", unshared);
-}
-
-TEST_F(SurroundingsTest, HiddenProcesses) {
-  const std::vector<std::string> unshared = {"unshare", "-rmpf"};
-  if (!Can({"unshare", "-rmpf", "mount", "-t", "proc", "-o", "hidepid=2", "none", "/proc", "--"}) &&
-      Run({"unshare", "-rmpf", "mount", "-t", "proc", "-o", "hidepid=2", "none", "/proc"}).status !=
-          0) {
-    GTEST_SKIP() << "/proc cannot be mounted here";
-  }
-  OnThisMachine("mount -t proc -o hidepid=2 none /proc && exec \"$@\"", unshared);
-}
-
 TEST_F(SurroundingsTest, UnprivilegedUser) {
   const std::vector<std::string> nobody = {"setpriv", "--reuid=65534", "--regid=65534",
                                            "--clear-groups", "--no-new-privs"};
   if (geteuid() == 0 && !Can(nobody)) GTEST_SKIP() << "no other user here";
-  const std::filesystem::perms all = std::filesystem::perms::all;
-  std::filesystem::permissions(Scratch(), all);
+  programs_ = ProgramsForAnyone();
   OnThisMachine("exec \"$@\"", geteuid() == 0 ? nobody : std::vector<std::string>());
 }
 

@@ -3,7 +3,7 @@
 # the bash completion: what is in one is in all.
 #   options_test.sh BIN_DIR GETOPT_PRINT
 set -euo pipefail
-bin=$1 getopt_print=$2
+bin=$1
 top=$(cd "$(dirname "${BASH_SOURCE[0]}")/../.." && pwd)
 
 # The usage texts are older than some options, and one names an option that is spelled otherwise.
@@ -22,6 +22,7 @@ declare -A reserved=([bootOption]='-u -w')
 scratch=$(mktemp -d)
 trap 'rm -rf "$scratch"' EXIT
 cd "$scratch"
+ln -s "$2" getopt_print  # LD_PRELOAD is parted by blanks and colons
 echo 'host name "empty"' | "$bin/kifcache" build - empty.kif
 export ZELLIBS_HOST=$scratch/empty.kif ASAN_OPTIONS=verify_asan_link_order=0
 status=0
@@ -83,7 +84,7 @@ check_tool() {
   [ -e "$page" ] || { echo "$tool: no man page"; status=1; return; }
   [ -L "$bin/$tool" ] || { echo "$tool: no link"; status=1; }
   # A tool without options does not ask for any; its output is no list of options.
-  taken=$(LD_PRELOAD=$getopt_print "$bin/zlkkiftools" "$tool" x 2>/dev/null | grep '^-' || true)
+  taken=$(LD_PRELOAD=$scratch/getopt_print "$bin/zlkkiftools" "$tool" x 2>/dev/null | grep '^-' || true)
   taken=$(without "$taken" "${reserved[$tool]-}")
   same "$tool" program "$taken" 'man page' "$(options_in_page "$page")"
 
