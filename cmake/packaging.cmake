@@ -7,7 +7,7 @@ install(TARGETS zellibs LIBRARY DESTINATION lib)
 
 # To write other tools over hosts and recordings: the library's face in C, the records in C++.
 configure_file(packaging/zellibs.pc.in zellibs.pc @ONLY)
-install(FILES lib/zellibs/include/zellibs.h DESTINATION include/zellibs)
+install(FILES lib/zellibs/include/zellibs.h lib/zellibs/include/nodes.def DESTINATION include/zellibs)
 install(DIRECTORY lib/records DESTINATION include/zellibs FILES_MATCHING PATTERN *.h)
 install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zellibs.pc DESTINATION share/pkgconfig)
 

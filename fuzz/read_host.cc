@@ -9,7 +9,6 @@
 namespace {
 
 constexpr int32_t kMostEntries = 12;  // of one list
-constexpr size_t kMostParameters = 4;
 
 unsigned char record[1 << 18];
 
@@ -19,10 +18,6 @@ bool IsAsked(const NodeInfo &node, const char *const *prefixes) {
     if (strncmp(node.path, *prefixes, strlen(*prefixes)) == 0) return true;
   }
   return false;
-}
-
-bool TakesParameters(const ParameterTypes &parameters, size_t count) {
-  return parameters.offered && strlen(parameters.types) == count;
 }
 
 void ReadContent(uint32_t number, KIF_ParamList *instance) {
@@ -42,10 +37,10 @@ void ReadContent(uint32_t number, KIF_ParamList *instance) {
 
 // Every text of a record ends within its field or fills it; the sanitizer sees the rest.
 void ReadAnswer(const NodeInfo &node, uint32_t number, KIF_ParamList *instance, size_t count) {
-  if (TakesParameters(node.offers.record, count)) {
-    KIF_Get(number, instance, record, node.offers.recordSize);
+  if (node.hasRecords && node.parameterCount == count) {
+    KIF_Get(number, instance, record, node.recordSize);
   }
-  if (TakesParameters(node.offers.content, count)) ReadContent(number, instance);
+  if (node.hasContents && node.parameterCount == count) ReadContent(number, instance);
 }
 
 void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t count);
@@ -70,7 +65,7 @@ void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t 
     const NodeInfo &node = kNodes[number - 1];
     if (!IsAsked(node, prefixes)) continue;
     ReadAnswer(node, number, selector, count);
-    if (count == kMostParameters || !TakesParameters(node.offers.list, count)) continue;
+    if (!node.hasLists || CountOfListParameters(node) != count) continue;
     KIF_ParamList *list = nullptr;
     if (KIF_GetInstanceListAlloc(number, selector, &list) != 0) continue;
     ReadBelow(prefixes, list, selector, count);

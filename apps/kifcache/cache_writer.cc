@@ -77,12 +77,16 @@ class ContentBuilder {
   flatbuffers::DetachedBuffer Build();
 
  private:
-  flatbuffers::Offset<cache::Node> AddNode(NodeIndex index);
+  flatbuffers::Offset<cache::Node> AddNode(const std::string &path, const NodeModel &node);
   flatbuffers::Offset<cache::Recording> AddRecording();
   std::vector<cache::Parameter> Convert(uint32_t first, uint32_t count);
   cache::Selector Convert(const cache::Selector &selector);
   uint32_t Place(uint32_t place, uint32_t length) {
     return bytes_.Intern(model_.BytesAt(place), length);
+  }
+  cache::Bytes Place(const std::string &text) {
+    const auto *bytes = reinterpret_cast<const uint8_t *>(text.data());
+    return {bytes_.Intern(bytes, text.size()), static_cast<uint32_t>(text.size())};
   }
 
   const HostModel &model_;
@@ -110,8 +114,8 @@ cache::Selector ContentBuilder::Convert(const cache::Selector &selector) {
   return {parameters_.Intern(converted.data(), converted.size()), selector.count()};
 }
 
-flatbuffers::Offset<cache::Node> ContentBuilder::AddNode(NodeIndex index) {
-  const NodeModel &node = model_.nodes[index];
+flatbuffers::Offset<cache::Node> ContentBuilder::AddNode(const std::string &path,
+                                                         const NodeModel &node) {
   std::vector<cache::List> lists;
   for (const auto &[list, line] : node.lists) {
     const auto entries = Convert(list.first(), list.count());
@@ -128,11 +132,11 @@ flatbuffers::Offset<cache::Node> ContentBuilder::AddNode(NodeIndex index) {
     contents.emplace_back(Convert(stored.selector()), stored.length_status(), stored.read_status(),
                           stored.total(), Place(stored.place(), stored.length()), stored.length());
   }
-  const auto path = builder_.CreateString(kNodes[index].path);
+  const auto pathAt = builder_.CreateString(path);
   const auto listsAt = lists.empty() ? 0 : builder_.CreateVectorOfStructs(lists);
   const auto recordsAt = records.empty() ? 0 : builder_.CreateVectorOfStructs(records);
   const auto contentsAt = contents.empty() ? 0 : builder_.CreateVectorOfStructs(contents);
-  return cache::CreateNode(builder_, path, listsAt, recordsAt, contentsAt, node.setStatus);
+  return cache::CreateNode(builder_, pathAt, listsAt, recordsAt, contentsAt, node.setStatus);
 }
 
 flatbuffers::Offset<cache::Recording> ContentBuilder::AddRecording() {
@@ -141,31 +145,48 @@ flatbuffers::Offset<cache::Recording> ContentBuilder::AddRecording() {
     return fact.empty() ? flatbuffers::Offset<flatbuffers::String>() : builder_.CreateString(fact);
   };
   const auto omitted = builder_.CreateVectorOfStrings(facts.omitted);
+  if (facts.minorVersion == 0) {
+    return cache::CreateRecording(
+        builder_, text(facts.name), text(facts.system), text(facts.release),
+        text(facts.architecture), text(facts.recorder), text(facts.rights),
+        text(facts.kernelBuildDate), facts.signature, facts.begin, facts.end, omitted);
+  }
+  std::vector<cache::Moments> moments;
+  for (const Moments &of : facts.moments) {
+    moments.emplace_back(Place(of.name), of.begin, of.end, of.beginSinceBoot, of.endSinceBoot);
+  }
+  std::vector<cache::Lack> lacks;
+  for (const Lack &lack : facts.lacks) {
+    lacks.emplace_back(Place(lack.what), lack.reason, lack.status, lack.count);
+  }
+  const auto momentsAt = moments.empty() ? 0 : builder_.CreateVectorOfStructs(moments);
+  const auto lacksAt = lacks.empty() ? 0 : builder_.CreateVectorOfStructs(lacks);
   return cache::CreateRecording(builder_, text(facts.name), text(facts.system), text(facts.release),
                                 text(facts.architecture), text(facts.recorder), text(facts.rights),
                                 text(facts.kernelBuildDate), facts.signature, facts.begin,
-                                facts.end, omitted);
+                                facts.end, omitted, facts.catalogue, text(facts.redaction),
+                                text(facts.bootID), facts.recorderCartel, momentsAt, lacksAt);
 }
 
 flatbuffers::DetachedBuffer ContentBuilder::Build() {
-  std::vector<NodeIndex> byPath;
-  for (const NodeInfo &node : kNodes) {
-    const NodeModel &model = model_.nodes[IndexOf(node)];
-    if (!model.lists.empty() || !model.records.empty() || !model.contents.empty() ||
-        model.setStatus != 0) {
-      byPath.push_back(IndexOf(node));
-    }
-  }
-  std::sort(byPath.begin(), byPath.end(), [](NodeIndex left, NodeIndex right) {
-    return strcmp(kNodes[left].path, kNodes[right].path) < 0;
-  });
   std::vector<flatbuffers::Offset<cache::Node>> nodes;
-  for (const NodeIndex index : byPath) nodes.push_back(AddNode(index));
+  std::vector<cache::Bytes> descriptions;
+  for (const auto &[path, node] : model_.nodes) {
+    if (node.lists.empty() && node.records.empty() && node.contents.empty() &&
+        node.setStatus == 0) {
+      continue;
+    }
+    nodes.push_back(AddNode(path, node));
+    if (model_.facts.minorVersion > 0) descriptions.push_back(Place(node.description));
+  }
   const auto nodesAt = builder_.CreateVector(nodes);
   const auto recording = AddRecording();
   const auto parameters = builder_.CreateVectorOfStructs(parameters_.items());
   const auto bytes = builder_.CreateVector(bytes_.items());
-  builder_.Finish(cache::CreateContent(builder_, recording, nodesAt, parameters, bytes));
+  const auto descriptionsAt =
+      descriptions.empty() ? 0 : builder_.CreateVectorOfStructs(descriptions);
+  builder_.Finish(
+      cache::CreateContent(builder_, recording, nodesAt, parameters, bytes, descriptionsAt));
   return builder_.Release();
 }
 
@@ -181,7 +202,8 @@ bool WriteCacheFile(const HostModel &model, const char *path) {
   builder.ForceVectorAlignment(content.size(), 1, alignof(cache::Parameter));
   const auto contentAt = builder.CreateVector(content.data(), content.size());
   const auto checksum = static_cast<uint32_t>(crc32_z(0, content.data(), content.size()));
-  cache::FinishFileBuffer(builder, cache::CreateFile(builder, kCacheMajorVersion,
-                                                     kCacheMinorVersion, checksum, contentAt));
+  cache::FinishFileBuffer(
+      builder, cache::CreateFile(builder, kCacheMajorVersion, model.facts.minorVersion, checksum,
+                                 contentAt));
   return WriteRecording(path, builder.GetBufferPointer(), builder.GetSize());
 }

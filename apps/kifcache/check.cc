@@ -65,6 +65,19 @@ std::string Shown(const std::string &text) {
   return quoted.substr(1, quoted.size() - 2);
 }
 
+void PrintConflict(const char *path, const char *what, void *stream) {
+  fprintf(static_cast<FILE *>(stream), "%-10s %s: %s\n", "conflict", path, what);
+}
+
+// Whether this kifcache reads the file's nodes as their recorder meant them, and where not.
+void PrintInterface(const CacheFile &file, const Facts &facts, FILE *stream) {
+  const bool isOurs = facts.signature == InterfaceSignature() && HasSameCatalogue(file);
+  const bool fits = FitsCatalogue(file, nullptr, nullptr);
+  fprintf(stream, "%-10s 0x%016" PRIx64 "%s%s\n", "interface", facts.signature,
+          isOurs && fits ? "" : ", not this kifcache's", !isOurs && fits ? ", but it fits" : "");
+  FitsCatalogue(file, PrintConflict, stream);
+}
+
 void PrintFacts(const CacheFile &file, const Facts &facts, FILE *stream) {
   const auto line = [stream](const char *label, const std::string &value) {
     if (!value.empty()) fprintf(stream, "%-10s %s\n", label, value.c_str());
@@ -82,9 +95,15 @@ void PrintFacts(const CacheFile &file, const Facts &facts, FILE *stream) {
   if (facts.begin != 0) line("recorded", Date(facts.begin) + " to " + Date(facts.end));
   line("recorder", Shown(facts.recorder));
   line("rights", Shown(facts.rights));
-  fprintf(stream, "%-10s 0x%016" PRIx64 "%s\n", "interface", facts.signature,
-          facts.signature == InterfaceSignature() ? "" : ", not this kifcache's");
+  if (!facts.redaction.empty()) line("redacted", Shown(facts.redaction));
+  PrintInterface(file, facts, stream);
   for (const std::string &text : facts.omitted) line("omitted", Shown(text));
+  for (const Lack &lack : facts.lacks) {
+    std::string text = Shown(lack.what) + ": " + ReasonText(lack.reason);
+    if (lack.count != 0) text += ", " + std::to_string(lack.count) + " answers";
+    if (lack.status != 0) text += std::string(", ") + ZLK_ReturnStatusToString(lack.status);
+    line("lacks", text);
+  }
 }
 
 void PrintCounts(const std::map<std::string, Counts> &counts, FILE *stream) {

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cstring>
 
+#include "description_text.h"
+
 // Once the model is too large nothing more is added to it; its size then says so.
 uint32_t HostModel::AddBytes(std::string_view bytes) {
   size_ += bytes.size();
@@ -26,36 +28,43 @@ cache::Selector HostModel::AddParameters(const Values &values) {
   return {first, static_cast<uint32_t>(values.size())};
 }
 
-void HostModel::AddList(NodeIndex node, const Values &parent, KIF_Status status,
+NodeModel *HostModel::NodeOf(std::string_view path) {
+  const auto known = nodes.find(path);
+  if (known != nodes.end()) return &known->second;
+  NodeModel *node = &nodes[std::string(path)];
+  const NodeInfo *info = FindNodeByPath(path.data(), path.size());
+  if (info != nullptr) node->description = DescriptionText(*info);
+  return node;
+}
+
+void HostModel::AddList(NodeModel *node, const Values &parent, KIF_Status status,
                         const Values &entries, uint32_t line) {
   size_ += sizeof(cache::List);
   const cache::Selector selector = AddParameters(parent);
   const cache::Selector run = AddParameters(entries);
   if (size_ > kMostModelSize) return;
-  nodes[node].lists.push_back({{selector, status, run.first(), run.count()}, line});
+  node->lists.push_back({{selector, status, run.first(), run.count()}, line});
 }
 
-void HostModel::AddRecord(NodeIndex node, const Values &instance, KIF_Status status,
+void HostModel::AddRecord(NodeModel *node, const Values &instance, KIF_Status status,
                           std::string_view record, uint32_t line) {
   size_ += sizeof(cache::Record);
   record = record.substr(0, record.find_last_not_of('\0') + 1);
   const cache::Selector selector = AddParameters(instance);
   const uint32_t place = AddBytes(record);
   if (size_ > kMostModelSize) return;
-  nodes[node].records.push_back(
-      {{selector, status, place, static_cast<uint32_t>(record.size())}, line});
+  node->records.push_back({{selector, status, place, static_cast<uint32_t>(record.size())}, line});
 }
 
-void HostModel::AddContent(NodeIndex node, const Values &instance, const ContentAnswer &content,
+void HostModel::AddContent(NodeModel *node, const Values &instance, const ContentAnswer &content,
                            uint32_t line) {
   size_ += sizeof(cache::Stored);
   const cache::Selector selector = AddParameters(instance);
   const uint32_t place = AddBytes(content.bytes);
   if (size_ > kMostModelSize) return;
-  nodes[node].contents.push_back(
-      {{selector, content.lengthStatus, content.readStatus, content.total, place,
-        static_cast<uint32_t>(content.bytes.size())},
-       line});
+  node->contents.push_back({{selector, content.lengthStatus, content.readStatus, content.total,
+                             place, static_cast<uint32_t>(content.bytes.size())},
+                            line});
 }
 
 int HostModel::Compare(const cache::Parameter &left, const cache::Parameter &right) const {
@@ -96,7 +105,7 @@ bool HostModel::Sort(std::vector<Given<Answer>> *answers, uint32_t *line, uint32
 }
 
 bool HostModel::Sort(uint32_t *line, uint32_t *firstLine) {
-  for (NodeModel &node : nodes) {
+  for (auto &[path, node] : nodes) {
     if (!Sort(&node.lists, line, firstLine)) return false;
     if (!Sort(&node.records, line, firstLine)) return false;
     if (!Sort(&node.contents, line, firstLine)) return false;

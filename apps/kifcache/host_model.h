@@ -4,10 +4,14 @@
 
 #include <compare>
 #include <cstdint>
+#include <functional>
+#include <iterator>
+#include <map>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "cache_file.h"
 #include "cache_generated.h"
 #include "nodes.h"
 #include "zellibs.h"
@@ -30,8 +34,26 @@ inline Value TextValue(const char *text) {
   return {cache::Kind::Text, 0, text};
 }
 
+// When a group of nodes was recorded, or the whole; see cache.fbs.
+struct Moments {
+  std::string name;
+  int64_t begin = 0;
+  int64_t end = 0;
+  int64_t beginSinceBoot = 0;
+  int64_t endSinceBoot = 0;
+};
+
+// Answers that are not there, or are a refusal; see cache.fbs.
+struct Lack {
+  std::string what;
+  cache::Reason reason = cache::Reason::Unasked;
+  KIF_Status status = 0;
+  uint64_t count = 0;
+};
+
 // What is told about a recording.
 struct Facts {
+  uint16_t minorVersion = kCacheMinorVersion;  // of the file's format
   std::string name;
   std::string system;
   std::string release;
@@ -43,6 +65,12 @@ struct Facts {
   int64_t begin = 0;  // seconds since 1970
   int64_t end = 0;
   std::vector<std::string> omitted;
+  uint64_t catalogue = CatalogueHash();
+  std::string redaction;
+  std::string bootID;
+  int64_t recorderCartel = 0;
+  std::vector<Moments> moments;
+  std::vector<Lack> lacks;
 };
 
 // The facts that are texts, under the names that the text form and JSON give them.
@@ -58,7 +86,18 @@ constexpr TextFact kTextFacts[] = {
     {"recorder", &Facts::recorder},
     {"rights", &Facts::rights},
     {"kernelBuildDate", &Facts::kernelBuildDate},
+    {"redaction", &Facts::redaction},
+    {"bootID", &Facts::bootID},
 };
+
+// The words for why answers are missing, by cache::Reason.
+constexpr const char *kReasons[] = {"unasked", "rights", "limits", "time", "asleep", "absent"};
+
+// The word, or the number of a reason that came later.
+inline std::string ReasonText(cache::Reason reason) {
+  const auto number = static_cast<uint32_t>(reason);
+  return number < std::size(kReasons) ? kReasons[number] : std::to_string(number);
+}
 
 // An answer of a node: its places are those of the model's own parameters and bytes. `line` is
 // where the text form gave it.
@@ -69,6 +108,7 @@ struct Given {
 };
 
 struct NodeModel {
+  std::string description;  // see description.h
   std::vector<Given<cache::List>> lists;
   std::vector<Given<cache::Record>> records;
   std::vector<Given<cache::Stored>> contents;
@@ -87,14 +127,18 @@ struct ContentAnswer {
 class HostModel {
  public:
   Facts facts;
-  NodeModel nodes[kNodeCount];
+  std::map<std::string, NodeModel, std::less<>> nodes;  // by path
 
-  void AddList(NodeIndex node, const Values &parent, KIF_Status status, const Values &entries,
+  // The node with a path, made at the first call: with the catalogue's own description, if it is
+  // there.
+  NodeModel *NodeOf(std::string_view path);
+
+  void AddList(NodeModel *node, const Values &parent, KIF_Status status, const Values &entries,
                uint32_t line = 0);
   // The zeros at the record's end are not kept.
-  void AddRecord(NodeIndex node, const Values &instance, KIF_Status status, std::string_view record,
-                 uint32_t line = 0);
-  void AddContent(NodeIndex node, const Values &instance, const ContentAnswer &content,
+  void AddRecord(NodeModel *node, const Values &instance, KIF_Status status,
+                 std::string_view record, uint32_t line = 0);
+  void AddContent(NodeModel *node, const Values &instance, const ContentAnswer &content,
                   uint32_t line = 0);
 
   // Puts the answers of every node in the order of their selectors. False where one selector has

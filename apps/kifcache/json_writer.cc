@@ -32,8 +32,11 @@ std::string Object(const std::vector<RecordPart> &parts, bool named) {
     if ((part.field != nullptr) != named) continue;
     if (object.size() > 1) object += ',';
     if (named) {
-      const bool isText = part.field->type == FieldType::kText;
-      object += JsonString(part.field->name) + ":" + (isText ? Text(part.bytes) : Decimal(part));
+      const FieldType type = part.field->type;
+      object += JsonString(part.field->name) + ":" +
+                (type == FieldType::kText    ? Text(part.bytes)
+                 : type == FieldType::kBytes ? JsonString(HexDigits(part.bytes))
+                                             : Decimal(part));
     } else {
       object += "\"" + std::to_string(part.offset) + "\":\"" + HexDigits(part.bytes) + "\"";
     }
@@ -53,6 +56,21 @@ void JsonWriter::OnHost(const Facts &facts) {
   fputs(",\"omitted\":[", stream_);
   for (const std::string &text : facts.omitted) {
     Write((&text != &facts.omitted.front() ? "," : "") + Text(text));
+  }
+  fprintf(stream_, "],\"minorVersion\":%u,\"recorderCartel\":%" PRId64 ",\"moments\":[",
+          facts.minorVersion, facts.recorderCartel);
+  for (const Moments &of : facts.moments) {
+    Write((&of != &facts.moments.front() ? ",{\"name\":" : "{\"name\":") + Text(of.name));
+    fprintf(stream_,
+            ",\"begin\":%" PRId64 ",\"end\":%" PRId64 ",\"beginSinceBoot\":%" PRId64
+            ",\"endSinceBoot\":%" PRId64 "}",
+            of.begin, of.end, of.beginSinceBoot, of.endSinceBoot);
+  }
+  fputs("],\"lacks\":[", stream_);
+  for (const Lack &lack : facts.lacks) {
+    Write((&lack != &facts.lacks.front() ? ",{\"what\":" : "{\"what\":") + Text(lack.what) +
+          ",\"reason\":" + JsonString(ReasonText(lack.reason)));
+    fprintf(stream_, ",\"status\":%u,\"count\":%" PRIu64 "}", lack.status, lack.count);
   }
   fputs("]}\n", stream_);
 }
@@ -76,7 +94,7 @@ void JsonWriter::OnRecord(const VisitedNode &node, const Values &instance, KIF_S
   Begin("record", node, "instance", instance);
   fprintf(stream_, ",\"status\":%u", status);
   if (status == 0) {
-    const auto parts = PartsOf(node.info, record);
+    const auto parts = PartsOf(node.description, record);
     Write(",\"fields\":" + Object(parts, true) + ",\"bytes\":" + Object(parts, false));
   }
   fputs("}\n", stream_);

@@ -7,11 +7,11 @@
 namespace {
 
 // The parameters that select, as in "(integer, text)".
-std::string Parameters(const ParameterTypes &parameters) {
+std::string Parameters(const NodeInfo &node, size_t count) {
   std::string written = "(";
-  for (const char *types = parameters.types; *types != '\0'; ++types) {
+  for (size_t i = 0; i < count; ++i) {
     if (written.size() > 1) written += ", ";
-    written += *types == 'i' ? "integer" : "text";
+    written += ParameterOf(node, i).type == kInteger ? "integer" : "text";
   }
   return written + ")";
 }
@@ -26,20 +26,17 @@ std::string Type(const NodeField &field) {
 
 void PrintNodes(FILE *stream) {
   for (const NodeInfo &node : kNodes) {
-    const NodeOffers &offers = node.offers;
+    const std::string selects = Parameters(node, node.parameterCount);
     fprintf(stream, "%s\n", node.path);
-    if (offers.list.offered) {
-      fprintf(stream, "  list %s\n", Parameters(offers.list).c_str());
+    if (node.hasLists) {
+      fprintf(stream, "  list %s\n", Parameters(node, CountOfListParameters(node)).c_str());
     }
-    if (offers.record.offered) {
-      fprintf(stream, "  record %s: %u bytes\n", Parameters(offers.record).c_str(),
-              offers.recordSize);
-    }
-    if (offers.content.offered) {
-      fprintf(stream, "  content %s\n", Parameters(offers.content).c_str());
-    }
-    if (offers.settable) fputs("  set\n", stream);
-    for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
+    if (node.hasRecords)
+      fprintf(stream, "  record %s: %u bytes\n", selects.c_str(), node.recordSize);
+    if (node.hasContents) fprintf(stream, "  content %s\n", selects.c_str());
+    if (node.settable) fputs("  set\n", stream);
+    const NodeField *fields = FieldsOf(node);
+    for (const NodeField *field = fields; field < fields + node.fieldCount; ++field) {
       fprintf(stream, "  %6u  %s: %s\n", field->offset, field->name, Type(*field).c_str());
     }
   }

@@ -1,5 +1,6 @@
 #include "record_parts.h"
 
+#include <algorithm>
 #include <cstring>
 
 namespace {
@@ -20,23 +21,21 @@ size_t EndOfRun(std::string_view record, std::string_view rest, size_t start) {
 
 }  // namespace
 
-std::vector<RecordPart> PartsOf(const NodeInfo *node, std::string_view record) {
+std::vector<RecordPart> PartsOf(const Description *node, std::string_view record) {
   std::vector<RecordPart> parts;
-  std::string whole(record);
-  if (node != nullptr && whole.size() < node->offers.recordSize) {
-    whole.resize(node->offers.recordSize);
-  }
-  std::string rest = whole;
-  const NodeField *field = node != nullptr ? FieldsOf(*node) : nullptr;
-  for (; field != nullptr && field->name != nullptr; ++field) {
-    std::string bytes = whole.substr(field->offset, field->size);
+  std::string rest(record);
+  for (size_t i = 0; node != nullptr && i < node->fieldCount; ++i) {
+    const NodeField *field = &node->fields[i];
+    std::string bytes(record.substr(std::min<size_t>(field->offset, record.size()), field->size));
     if (field->type == FieldType::kText) bytes.resize(strnlen(bytes.data(), bytes.size()));
-    rest.replace(field->offset, bytes.size(), bytes.size(), '\0');
+    if (!bytes.empty()) rest.replace(field->offset, bytes.size(), bytes.size(), '\0');
+    const bool isNumber = field->type == FieldType::kUnsigned || field->type == FieldType::kSigned;
+    if (isNumber) bytes.resize(field->size);
     parts.push_back({field, field->offset, std::move(bytes)});
   }
   size_t start = 0;
   while ((start = rest.find_first_not_of('\0', start)) != rest.npos) {
-    const size_t end = EndOfRun(whole, rest, start);
+    const size_t end = EndOfRun(record, rest, start);
     parts.push_back({nullptr, static_cast<uint32_t>(start), rest.substr(start, end - start)});
     start = end;
   }

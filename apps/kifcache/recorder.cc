@@ -18,6 +18,8 @@
 #include "redact.h"
 #include "status.h"
 
+extern "C" __attribute__((weak)) bool KIF_HostIsForeign();
+
 namespace {
 
 constexpr uint32_t kMostContent = uint32_t{64} << 20;
@@ -25,12 +27,22 @@ constexpr uint32_t kChunk = 3 << 20;                      // of a content that i
 constexpr uint64_t kMostPcpuRecords = uint64_t{2} << 20;  // a count may be anything
 constexpr uint64_t kMostRecorded = kMostModelSize / 2;    // then answers are left out
 
-// The numbers behind the nodes are the library's.
+// The numbers behind the nodes are the library's; those beyond the tools have no variable.
 const KIF_NodeId *const kNodeIds[kNodeCount] = {
 #define NODE(path, ...) &KIF_NODE_##path,
+#define BEYOND(...) nullptr,
 #include "nodes.def"
-#undef NODE
 };
+
+uint32_t NumberOf(NodeIndex node) {
+  return kNodeIds[node] != nullptr ? *kNodeIds[node] : node + 1u;
+}
+
+// Whether the library's catalogue is this one, so that it numbers the nodes without a variable so.
+bool HasOurCatalogue() {
+  uint64_t hash = 0;
+  return KIF_Get(kCatalogueNumber, nullptr, &hash, sizeof(hash)) == 0 && hash == CatalogueHash();
+}
 
 [[noreturn]] void OutOfMemory() {
   fputs("kifcache: out of memory\n", stderr);
@@ -65,8 +77,8 @@ NodeIndex ListAbove(const NodeInfo &node) {
   size_t longest = 0;
   for (const NodeInfo &candidate : kNodes) {
     const size_t length = strlen(candidate.path);
-    if (candidate.offers.list.offered && length > longest &&
-        strncmp(node.path, candidate.path, length) == 0 && node.path[length] == '_') {
+    if (candidate.hasLists && length > longest && strncmp(node.path, candidate.path, length) == 0 &&
+        node.path[length] == '_') {
       longest = length;
       above = IndexOf(candidate);
     }
@@ -77,7 +89,8 @@ NodeIndex ListAbove(const NodeInfo &node) {
 // The value of an unsigned field of a record.
 uint64_t FieldOf(const NodeInfo &node, const char *name, const std::string &record) {
   uint64_t value = 0;
-  for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
+  const NodeField *fields = FieldsOf(node);
+  for (const NodeField *field = fields; field < fields + node.fieldCount; ++field) {
     if (strcmp(field->name, name) == 0) memcpy(&value, &record[field->offset], field->size);
   }
   return value;
@@ -85,8 +98,8 @@ uint64_t FieldOf(const NodeInfo &node, const char *name, const std::string &reco
 
 // Whether the records of two nodes have the same instances, so that they are read together.
 bool ShareInstances(const NodeInfo &left, const NodeInfo &right) {
-  return !left.offers.list.offered && !right.offers.list.offered &&
-         left.offers.instances == right.offers.instances && ListAbove(left) == ListAbove(right);
+  return !left.hasLists && !right.hasLists && left.group == right.group &&
+         left.instances == right.instances && ListAbove(left) == ListAbove(right);
 }
 
 // Leaves every value once, in the order of their first places.
@@ -98,13 +111,53 @@ void DropRepeated(Values *values) {
   std::erase_if(*values, [&seen](const Value &value) { return !seen.insert(value).second; });
 }
 
+constexpr int64_t kNanoseconds = 1000000000;
+
+// Moments of the recording. SOURCE_DATE_EPOCH fixes those of the wall clock, in seconds, and takes
+// away what differs from run to run; the time since the boot is that of this machine alone.
+class Clock {
+ public:
+  explicit Clock(bool isThisMachine)
+      : fixed_(getenv("SOURCE_DATE_EPOCH")), tellsBoot_(isThisMachine && fixed_ == nullptr) {}
+
+  bool isFixed() const { return fixed_ != nullptr; }
+  Moments Begin(const char *name) const {
+    const int64_t now = Now();
+    const int64_t sinceBoot = SinceBoot();
+    return {name, now, now, sinceBoot, sinceBoot};
+  }
+  void End(Moments *of) const {
+    of->end = Now();
+    of->endSinceBoot = SinceBoot();
+  }
+
+ private:
+  static int64_t Read(clockid_t clock) {
+    struct timespec time = {};
+    clock_gettime(clock, &time);
+    return int64_t{time.tv_sec} * kNanoseconds + time.tv_nsec;
+  }
+  int64_t Now() const {
+    return fixed_ != nullptr ? strtoll(fixed_, nullptr, 10) * kNanoseconds : Read(CLOCK_REALTIME);
+  }
+  int64_t SinceBoot() const { return tellsBoot_ ? Read(CLOCK_BOOTTIME) : 0; }
+
+  const char *const fixed_;
+  const bool tellsBoot_;
+};
+
 class Recorder {
  public:
-  Recorder(const RecordOptions &options, HostModel *model) : options_(options), model_(model) {}
+  Recorder(const RecordOptions &options, const Clock &clock, HostModel *model)
+      : options_(options), clock_(clock), model_(model) {
+    for (const NodeInfo &node : kNodes) models_[IndexOf(node)] = model->NodeOf(node.path);
+  }
 
   void Record();
 
  private:
+  void RecordRows(size_t first, size_t end);
+  Moments *MomentsOf(Group group);
   void RecordOwnLists(const NodeInfo &node);
   void RecordTogether(size_t first, size_t end);
   void RecordByPcpu(size_t first, size_t end);
@@ -112,7 +165,6 @@ class Recorder {
   void RecordList(const NodeInfo &node, const Values &parent, Values *entries);
   void RecordRecord(const NodeInfo &node, const Values &instance, KIF_ParamList *selector);
   void RecordContent(const NodeInfo &node, const Values &instance, KIF_ParamList *selector);
-  void Redact(NodeIndex node, std::string *record) const;
 
   const std::vector<Values> &ListInstances(NodeIndex list);
   const std::vector<Values> &Parents(const NodeInfo &node);
@@ -121,15 +173,19 @@ class Recorder {
   uint64_t CountPcpus();
 
   bool HasRoom(const NodeInfo &node);
-  void TellOmitted();
+  void TellLacks();
 
   const RecordOptions &options_;
+  const Clock &clock_;
   HostModel *model_;
+  NodeModel *models_[kNodeCount];
+  const bool hasOurCatalogue_ = HasOurCatalogue();
   // The instances of each list node, each once, as parameters from the outermost one on.
   bool walked_[kNodeCount] = {};
   std::vector<Values> instances_[kNodeCount];
   std::set<Values> cartelsOfWorlds_;
   uint64_t omitted_[kNodeCount] = {};
+  uint64_t refused_[kNodeCount] = {};
   Progress progress_{"answers"};
 };
 
@@ -138,16 +194,33 @@ void Recorder::Record() {
     const NodeInfo &node = kNodes[row];
     size_t end = row + 1;
     while (end < kNodeCount && ShareInstances(node, kNodes[end])) ++end;
-    if (!node.offers.list.offered) {
-      RecordTogether(row, end);
-    } else if (!node.offers.record.offered) {
-      ListInstances(IndexOf(node));
-    } else {
-      RecordOwnLists(node);
-    }
+    RecordRows(row, end);
     row = end;
   }
-  TellOmitted();
+  TellLacks();
+}
+
+// Records the rows from `first` up to `end`, which are of one group and share their instances.
+void Recorder::RecordRows(size_t row, size_t end) {
+  const NodeInfo &node = kNodes[row];
+  if (!node.hasVariable && !hasOurCatalogue_) return;
+  Moments *of = MomentsOf(node.group);
+  if (!node.hasLists) {
+    RecordTogether(row, end);
+  } else if (!node.hasRecords) {
+    ListInstances(IndexOf(node));
+  } else {
+    RecordOwnLists(node);
+  }
+  clock_.End(of);
+}
+
+Moments *Recorder::MomentsOf(Group group) {
+  std::vector<Moments> &all = model_->facts.moments;
+  const auto known = std::find_if(
+      all.begin(), all.end(), [group](const Moments &of) { return of.name == GroupName(group); });
+  if (known != all.end()) return &*known;
+  return &all.emplace_back(clock_.Begin(GroupName(group)));
 }
 
 // Whether there is room for another answer; those that find none are counted.
@@ -158,12 +231,18 @@ bool Recorder::HasRoom(const NodeInfo &node) {
   return false;
 }
 
-void Recorder::TellOmitted() {
+void Recorder::TellLacks() {
+  std::vector<Lack> &lacks = model_->facts.lacks;
   for (const NodeInfo &node : kNodes) {
-    const uint64_t count = omitted_[IndexOf(node)];
-    if (count == 0) continue;
-    model_->facts.omitted.push_back(std::string(node.path) + ": " + std::to_string(count) +
-                                    (count == 1 ? " answer" : " answers"));
+    const uint64_t refused = refused_[IndexOf(node)];
+    const uint64_t omitted = omitted_[IndexOf(node)];
+    if (!node.hasVariable && !hasOurCatalogue_) {
+      lacks.push_back({node.path, cache::Reason::Unasked, 0, 0});
+    }
+    if (refused != 0) {
+      lacks.push_back({node.path, cache::Reason::Rights, KIF_STATUS_NO_PERMISSION, refused});
+    }
+    if (omitted != 0) lacks.push_back({node.path, cache::Reason::Limits, 0, omitted});
   }
 }
 
@@ -174,7 +253,7 @@ void Recorder::RecordList(const NodeInfo &node, const Values &parent, Values *en
   if (!HasRoom(node)) return;
   const ParamListHandle selector = ListOf(parent);
   KIF_ParamList *fetched = nullptr;
-  KIF_Status status = KIF_GetInstanceListAlloc(*kNodeIds[IndexOf(node)], selector.get(), &fetched);
+  KIF_Status status = KIF_GetInstanceListAlloc(NumberOf(IndexOf(node)), selector.get(), &fetched);
   if (status == 0 && fetched == nullptr) status = KIF_STATUS_FAILURE;
   if (status == KIF_STATUS_NOT_FOUND) return;
   const ParamListHandle list(status == 0 ? fetched : nullptr);
@@ -189,7 +268,8 @@ void Recorder::RecordList(const NodeInfo &node, const Values &parent, Values *en
       ++omitted_[IndexOf(node)];
     }
   }
-  model_->AddList(IndexOf(node), parent, status, *entries);
+  if (status == KIF_STATUS_NO_PERMISSION) ++refused_[IndexOf(node)];
+  model_->AddList(models_[IndexOf(node)], parent, status, *entries);
 }
 
 // Walks the lists of a node, the first time it is asked for.
@@ -208,12 +288,9 @@ const std::vector<Values> &Recorder::ListInstances(NodeIndex list) {
 // The instances that a node stands below; the one without parameters at the top.
 const std::vector<Values> &Recorder::Parents(const NodeInfo &node) {
   static const std::vector<Values> top(1);
-  const NodeOffers &offers = node.offers;
-  const ParameterTypes &parameters = offers.list.offered     ? offers.list
-                                     : offers.record.offered ? offers.record
-                                                             : offers.content;
+  const size_t count = node.hasLists ? CountOfListParameters(node) : node.parameterCount;
   const NodeIndex above = ListAbove(node);
-  return parameters.types[0] == '\0' || above == kNodeCount ? top : ListInstances(above);
+  return count == 0 || above == kNodeCount ? top : ListInstances(above);
 }
 
 // A cartel's ID stands for its main world.
@@ -235,15 +312,15 @@ void Recorder::AddCartelsOfWorlds() {
 
 uint64_t Recorder::CountPcpus() {
   const NodeInfo &node = kNodes[kNode_hardware_cpu_cpuInfo];
-  std::string record(node.offers.recordSize, '\0');
+  std::string record(node.recordSize, '\0');
   const KIF_Status status =
-      KIF_Get(KIF_NODE_hardware_cpu_cpuInfo, nullptr, record.data(), node.offers.recordSize);
+      KIF_Get(KIF_NODE_hardware_cpu_cpuInfo, nullptr, record.data(), node.recordSize);
   return status == 0 ? FieldOf(node, "numPcpus", record) : 0;
 }
 
 // Records the instances below each parent, and the record of each of them.
 void Recorder::RecordOwnLists(const NodeInfo &node) {
-  const bool byPlace = node.offers.instances == Instances::kOwnListIndex;
+  const bool byPlace = node.instances == Instances::kOwnListIndex;
   const size_t row = IndexOf(node);
   Values entries;
   for (const Values &parent : Parents(node)) {
@@ -259,7 +336,7 @@ void Recorder::RecordOwnLists(const NodeInfo &node) {
 // Records the nodes in the rows from `first` up to `end`, which share their instances: what
 // belongs to one instance is read at one time.
 void Recorder::RecordTogether(size_t first, size_t end) {
-  switch (kNodes[first].offers.instances) {
+  switch (kNodes[first].instances) {
     case Instances::kGroupZero:
       return RecordAnswers(first, end, {IntegerValue(0)});
     case Instances::kWorlds:
@@ -290,29 +367,28 @@ void Recorder::RecordAnswers(size_t first, size_t end, const Values &instance) {
   for (size_t row = first; row < end; ++row) {
     const NodeInfo &node = kNodes[row];
     if (!HasRoom(node)) continue;
-    if (node.offers.record.offered) RecordRecord(node, instance, selector.get());
-    if (node.offers.content.offered) RecordContent(node, instance, selector.get());
+    if (node.hasRecords) RecordRecord(node, instance, selector.get());
+    if (node.hasContents) RecordContent(node, instance, selector.get());
   }
 }
 
 void Recorder::RecordRecord(const NodeInfo &node, const Values &instance, KIF_ParamList *selector) {
   const NodeIndex index = IndexOf(node);
-  std::string record(node.offers.recordSize, '\0');
-  const KIF_Status status =
-      KIF_Get(*kNodeIds[index], selector, record.data(), node.offers.recordSize);
+  std::string record(node.recordSize, '\0');
+  const KIF_Status status = KIF_Get(NumberOf(index), selector, record.data(), node.recordSize);
   if (status == KIF_STATUS_NOT_FOUND) return;
+  if (status == KIF_STATUS_NO_PERMISSION) ++refused_[index];
   if (status != 0) record.clear();
   if (status == 0 && index == kNode_world_info) {
     const uint64_t cartel = FieldOf(node, "cartelID", record);
     if (cartel != 0) cartelsOfWorlds_.insert({IntegerValue(static_cast<int64_t>(cartel))});
   }
-  if (options_.redact && status == 0) Redact(index, &record);
-  model_->AddRecord(index, instance, status, record);
+  if (options_.redact && status == 0) RedactRecord(node, &record);
+  model_->AddRecord(models_[index], instance, status, record);
 }
 
 // Reads the content in chunks into `*bytes`. The result is that of the first chunk that fails.
-KIF_Status ReadContent(KIF_NodeId node, KIF_ParamList *selector, uint32_t total,
-                       std::string *bytes) {
+KIF_Status ReadContent(uint32_t node, KIF_ParamList *selector, uint32_t total, std::string *bytes) {
   const uint32_t wanted = std::min(total, kChunk);
   while (bytes->size() < total) {
     const uint32_t request[] = {static_cast<uint32_t>(bytes->size()), wanted};
@@ -332,7 +408,7 @@ KIF_Status ReadContent(KIF_NodeId node, KIF_ParamList *selector, uint32_t total,
 
 void Recorder::RecordContent(const NodeInfo &node, const Values &instance,
                              KIF_ParamList *selector) {
-  const KIF_NodeId id = *kNodeIds[IndexOf(node)];
+  const uint32_t id = NumberOf(IndexOf(node));
   ContentAnswer content;
   content.lengthStatus = KIF_GetDataLength(id, selector, &content.total);
   if (content.lengthStatus == KIF_STATUS_NOT_FOUND) return;
@@ -346,43 +422,12 @@ void Recorder::RecordContent(const NodeInfo &node, const Values &instance,
     content.readStatus = ReadContent(id, selector, content.total, &content.bytes);
     if (content.readStatus != 0) content.bytes.clear();
   }
+  if (content.readStatus == KIF_STATUS_NO_PERMISSION) ++refused_[IndexOf(node)];
   if (options_.redact && content.readStatus == 0) {
-    content.bytes = Redacted();
+    RedactContent(node, &content.bytes);
     content.total = static_cast<uint32_t>(content.bytes.size());
   }
-  model_->AddContent(IndexOf(node), instance, content);
-}
-
-// Puts `text` in the place of a text that stands in `size` bytes of a record.
-void ReplaceText(std::string text, char *field, size_t size) {
-  text.resize(std::min(text.size(), size - 1));
-  text.resize(size, '\0');
-  memcpy(field, text.data(), size);
-}
-
-void Recorder::Redact(NodeIndex node, std::string *record) const {
-  char *bytes = record->data();
-  switch (node) {
-    case kNode_userworld_cartel_cmdline:
-      return ReplaceText(RedactBehindFirstWord(bytes), bytes, record->size());
-    case kNode_system_bootCmdLine:
-      return ReplaceText(RedactBootCommandLine(bytes), bytes, record->size());
-    case kNode_system_bootMAC:
-      return ReplaceText(*bytes != '\0' ? Redacted() : "", bytes, record->size());
-    case kNode_userworld_cartel_fd_fds: {
-      auto *descriptor = reinterpret_cast<DescriptorRecord *>(bytes);
-      if (strncmp(descriptor->kind, "SOCKET", sizeof(descriptor->kind)) != 0) return;
-      return ReplaceText(RedactBehindFirstWord(descriptor->description), descriptor->description,
-                         sizeof(descriptor->description));
-    }
-    default:
-      return;
-  }
-}
-
-int64_t Now() {
-  const char *fixed = getenv("SOURCE_DATE_EPOCH");
-  return fixed != nullptr ? strtoll(fixed, nullptr, 10) : time(nullptr);
+  model_->AddContent(models_[IndexOf(node)], instance, content);
 }
 
 // The host may be a file or a tree of files from elsewhere. No node has the name of the machine,
@@ -409,11 +454,20 @@ void TellOfMachine(Facts *facts) {
 // answer says what is wrong with the host itself, such as a file that is none.
 KIF_Status StatusOfHost() {
   const ParamListHandle nobody = ListOf({IntegerValue(-1), IntegerValue(-1)});
-  const uint32_t size = kNodes[kNode_world_info].offers.recordSize;
+  const uint32_t size = kNodes[kNode_world_info].recordSize;
   std::string record(size, '\0');
   const KIF_Status status = KIF_Get(KIF_NODE_world_info, nobody.get(), record.data(), size);
   const bool isAnswer = status == KIF_STATUS_NOT_FOUND || status == KIF_STATUS_BAD_PARAMETER;
   return isAnswer || HostType_OSIsZLK() ? KIF_STATUS_OK : status;
+}
+
+// What only this machine has, where it is the host.
+void TellOfBoot(const Clock &clock, Facts *facts) {
+  char bootID[37] = "";
+  FILE *file = fopen("/proc/sys/kernel/random/boot_id", "re");
+  if (file != nullptr && fgets(bootID, sizeof(bootID), file) != nullptr) facts->bootID = bootID;
+  if (file != nullptr) fclose(file);
+  if (!clock.isFixed()) facts->recorderCartel = getpid();
 }
 
 }  // namespace
@@ -436,9 +490,16 @@ bool RecordHost(const RecordOptions &options, HostModel *model) {
   date[sizeof(date) - 1] = '\0';
   TellOfMachine(&model->facts);
   model->facts.kernelBuildDate = date;
-  model->facts.begin = Now();
-  Recorder(options, model).Record();
-  model->facts.end = Now();
+  const bool isThisMachine = KIF_HostIsForeign == nullptr || !KIF_HostIsForeign();
+  const Clock clock(isThisMachine);
+  if (isThisMachine) TellOfBoot(clock, &model->facts);
+  if (options.redact) model->facts.redaction = kRedactionRules;
+  Moments whole = clock.Begin("recording");
+  Recorder(options, clock, model).Record();
+  clock.End(&whole);
+  model->facts.begin = whole.begin / kNanoseconds;
+  model->facts.end = whole.end / kNanoseconds;
+  model->facts.moments.insert(model->facts.moments.begin(), whole);
   uint32_t line;
   uint32_t firstLine;
   (void)model->Sort(&line, &firstLine);

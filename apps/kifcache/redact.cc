@@ -1,5 +1,11 @@
 #include "redact.h"
 
+#include <algorithm>
+#include <cstring>
+#include <string_view>
+
+#include "marks.h"
+
 namespace {
 
 constexpr char kEllipsis[] = "…";
@@ -20,8 +26,6 @@ std::string_view TakeWord(std::string_view *text) {
   text->remove_prefix(end);
   return word;
 }
-
-}  // namespace
 
 std::string RedactBehindFirstWord(std::string_view text) {
   const size_t blank = text.find(' ');
@@ -46,6 +50,39 @@ std::string RedactBootCommandLine(std::string_view commandLine) {
   }
 }
 
-std::string Redacted() {
-  return kEllipsis;
+std::string Redacted(std::string_view text, Privacy privacy) {
+  switch (privacy) {
+    case Privacy::kCommandLine:
+    case Privacy::kSocket:
+      return RedactBehindFirstWord(text);
+    case Privacy::kBootCommandLine:
+      return RedactBootCommandLine(text);
+    case Privacy::kPrivate:
+    case Privacy::kAddress:
+      return text.empty() ? "" : kEllipsis;
+    default:
+      return std::string(text);
+  }
+}
+
+}  // namespace
+
+void RedactRecord(const NodeInfo &node, std::string *record) {
+  const MarkedAnswer answer = {nullptr, *record};
+  for (size_t i = 0; i < node.fieldCount; ++i) {
+    const NodeField &field = FieldsOf(node)[i];
+    if (field.type != FieldType::kText) continue;
+    char *bytes = record->data() + field.offset;
+    const std::string_view text(bytes, strnlen(bytes, field.size));
+    std::string redacted = Redacted(text, MarksOfField(node, i).privacy.Of(answer));
+    if (redacted == text) continue;
+    redacted.resize(std::min<size_t>(redacted.size(), field.size - 1));
+    redacted.resize(field.size, '\0');
+    memcpy(bytes, redacted.data(), field.size);
+  }
+}
+
+void RedactContent(const NodeInfo &node, std::string *content) {
+  const Privacy privacy = MarksOfOtherBytes(node).privacy.Of({nullptr, *content});
+  if (privacy != Privacy::kPublic) *content = kEllipsis;
 }

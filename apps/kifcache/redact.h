@@ -1,15 +1,14 @@
-// Taking out of a recording what may be private.
+// Taking out of a recording what may be private, as the marks of the catalogue say. Texts that name
+// a thing stay, but for addresses, and so do bytes that no field names.
 #pragma once
 
 #include <string>
-#include <string_view>
 
-// The first word of a text, and "…" in the place of the others: of a command line the program, of a
-// socket its protocol.
-std::string RedactBehindFirstWord(std::string_view text);
+#include "nodes.h"
 
-// A boot command line in which every option's value, and every word after a lone "--", is "…".
-std::string RedactBootCommandLine(std::string_view commandLine);
+// The rules that are followed here, as they stand in the facts of a recording.
+constexpr char kRedactionRules[] = "rules 1";
 
-// What stands in the place of a file of boot options and of a hardware address.
-std::string Redacted();
+// Redacts a record of `node`, whole in `*record`, or a content.
+void RedactRecord(const NodeInfo &node, std::string *record);
+void RedactContent(const NodeInfo &node, std::string *content);

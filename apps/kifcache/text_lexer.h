@@ -27,7 +27,13 @@ bool ParseHex(std::string_view digits, std::string *bytes);
 // which line of the file `name`, and gives false.
 class TextLexer {
  public:
-  TextLexer(std::string_view text, const char *name) : rest_(text), name_(name) {}
+  TextLexer(std::string_view text, const char *name) : text_(text), rest_(text), name_(name) {}
+
+  // Goes back to before the first line.
+  void Rewind() {
+    rest_ = text_;
+    lineNumber_ = 0;
+  }
 
   // Goes to the next line that has anything but a comment; false at the end.
   bool NextLine();
@@ -53,6 +59,7 @@ class TextLexer {
  private:
   void SkipBlanks();
 
+  std::string_view text_;
   std::string_view rest_;
   const char *name_;
 };

@@ -1,7 +1,10 @@
 #include "text_reader.h"
 
+#include <algorithm>
 #include <cstring>
+#include <iterator>
 
+#include "description_text.h"
 #include "text_lexer.h"
 
 namespace {
@@ -37,6 +40,13 @@ class Reader : TextLexer {
   bool Read();
 
  private:
+  // A node that the text names: its answers, and what they look like.
+  struct Node {
+    std::string path;
+    NodeModel *model;
+    Description description;
+  };
+
   // Each reads what is left of the line, or the part of it that its name says. False: an error,
   // which has been said.
   bool ReadLine();
@@ -47,24 +57,34 @@ class Reader : TextLexer {
   bool ReadContent();
   bool ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasStatus);
   bool ReadSet();
-  bool ReadNode(ParameterTypes NodeOffers::*parameters, const char *what, const NodeInfo **node);
-  bool ReadSelector(const NodeInfo &node, const char *parameters, Values *values);
+  bool ReadNodeLine();
+  bool ReadMoments();
+  bool ReadLack();
+  bool ReadNode(bool Description::*offer, const char *what, const Node **node);
+  bool ReadSelector(const Node &node, size_t wanted, Values *values);
   bool ReadValue(Value *value);
-  bool ReadPart(const NodeInfo &node, std::string *record);
-  bool FindPart(const NodeInfo &node, std::string_view name, Part *part);
+  bool ReadPart(const Node &node, std::string *record);
+  bool FindPart(const Node &node, std::string_view name, Part *part);
   bool FindPartByOffset(std::string_view name, Part *part);
   bool ReadPartText(const Part &part, std::string_view name, std::string *bytes);
   bool ReadPartNumber(const Part &part, std::string_view name, std::string *bytes);
   bool ReadEndOfLine();
 
   HostModel *model_;
+  std::map<std::string, Node, std::less<>> nodes_;
   Values values_;
   Values entries_;
   std::string bytes_;
 };
 
 bool Reader::Read() {
+  // The lines that describe nodes come first, wherever they stand.
   while (NextLine()) {
+    if (TakeWord("node") && !ReadNodeLine()) return false;
+  }
+  Rewind();
+  while (NextLine()) {
+    if (TakeWord("node")) continue;
     if (!ReadLine() || !ReadEndOfLine()) return false;
   }
   uint32_t firstLine = 0;
@@ -81,7 +101,7 @@ bool Reader::ReadLine() {
   if (kind == "record") return ReadRecord();
   if (kind == "content") return ReadContent();
   if (kind == "set") return ReadSet();
-  return Fail("a line begins with host, list, record, content or set, not with \"%.*s\"",
+  return Fail("a line begins with host, node, list, record, content or set, not with \"%.*s\"",
               PRINTED(kind));
 }
 
@@ -110,31 +130,106 @@ bool Reader::ReadFact(std::string_view key) {
     (key == "begin" ? facts.begin : facts.end) = static_cast<int64_t>(number.bits);
     return true;
   }
+  if (key == "catalogue") {
+    if (!ReadNumber("catalogue", &number)) return false;
+    facts.catalogue = number.bits;
+    return true;
+  }
+  if (key == "recorderCartel") {
+    if (!ReadNumber("cartel", &number)) return false;
+    facts.recorderCartel = static_cast<int64_t>(number.bits);
+    return true;
+  }
+  if (key == "minorVersion") {
+    if (!ReadNumber("version", &number)) return false;
+    facts.minorVersion = number.bits == 0 ? 0 : kCacheMinorVersion;
+    return true;
+  }
+  if (key == "moments") return ReadMoments();
+  if (key == "lack") return ReadLack();
   return Fail("unknown fact \"%.*s\"", PRINTED(key));
 }
 
-// Reads a node that has `what`; `parameters` is the member of its offers that says so.
-bool Reader::ReadNode(ParameterTypes NodeOffers::*parameters, const char *what,
-                      const NodeInfo **node) {
-  const std::string_view path = NextWord(false);
-  *node = FindNodeByPath(path.data(), path.size());
-  if (*node == nullptr) return Fail("no node is named \"%.*s\"", PRINTED(path));
-  if (parameters != nullptr && !((*node)->offers.*parameters).offered) {
-    return Fail("%s has no %s", (*node)->path, what);
+bool Reader::ReadMoments() {
+  Moments &of = model_->facts.moments.emplace_back();
+  if (!ReadPlainText(&of.name, "group")) return false;
+  for (int64_t *moment : {&of.begin, &of.end, &of.beginSinceBoot, &of.endSinceBoot}) {
+    Number number;
+    if (!ReadNumber("time", &number)) return false;
+    *moment = static_cast<int64_t>(number.bits);
   }
   return true;
 }
 
-bool Reader::ReadSelector(const NodeInfo &node, const char *parameters, Values *values) {
+bool Reader::ReadLack() {
+  Lack &lack = model_->facts.lacks.emplace_back();
+  if (!ReadPlainText(&lack.what, "node or group")) return false;
+  const std::string_view reason = NextWord(false);
+  const auto *const known = std::find(std::begin(kReasons), std::end(kReasons), reason);
+  Number number;
+  if (known != std::end(kReasons)) {
+    number.bits = static_cast<uint64_t>(known - kReasons);
+  } else if (!ParseNumber(reason, &number) || number.negative || !Fits(number, 4)) {
+    return Fail("\"%.*s\" is no reason", PRINTED(reason));
+  }
+  lack.reason = static_cast<cache::Reason>(number.bits);
+  if (!TakeWord("status") || !ReadUnsigned32("status", &lack.status) || !TakeWord("count")) {
+    return Fail("a lack has a reason, a status and a count");
+  }
+  if (!ReadNumber("count", &number)) return false;
+  lack.count = number.bits;
+  return true;
+}
+
+// Reads how the file describes a node, in which it is right against the catalogue.
+bool Reader::ReadNodeLine() {
+  const std::string path(NextWord(false));
+  if (path.empty() || !TakeWord("=")) return Fail("\"=\" is missing");
+  if (AtEnd()) return Fail("a description is missing");
+  while (line_.ends_with(' ')) line_.remove_suffix(1);
+  Node &node = nodes_[path];
+  if (node.model != nullptr) return Fail("%s is described twice", path.c_str());
+  if (!ReadDescription(line_.data(), line_.size(), &node.description)) {
+    return Fail("\"%.*s\" is no description of a node", PRINTED(line_));
+  }
+  node.path = path;
+  node.model = model_->NodeOf(path);
+  const NodeInfo *info = FindNodeByPath(path.data(), path.size());
+  const std::string words(line_);
+  // A hash is that of one catalogue: whoever has another one must look.
+  if (!IsOurs(info, words)) model_->facts.catalogue = 0;
+  node.model->description = words;
+  return true;
+}
+
+// Reads a node that has `what`; `offer` is the member of its description that says so.
+bool Reader::ReadNode(bool Description::*offer, const char *what, const Node **node) {
+  const std::string_view path = NextWord(false);
+  auto found = nodes_.find(path);
+  if (found == nodes_.end()) {
+    const NodeInfo *info = FindNodeByPath(path.data(), path.size());
+    if (info == nullptr) return Fail("no node is named \"%.*s\"", PRINTED(path));
+    found = nodes_.try_emplace(std::string(path)).first;
+    found->second.path = path;
+    found->second.model = model_->NodeOf(path);
+    Describe(*info, &found->second.description);
+  }
+  *node = &found->second;
+  if (offer != nullptr && !(found->second.description.*offer)) {
+    return Fail("%s has no %s", found->second.path.c_str(), what);
+  }
+  return true;
+}
+
+bool Reader::ReadSelector(const Node &node, size_t wanted, Values *values) {
   values->clear();
   while (!TakeWord("=")) {
     if (AtEnd()) return Fail("\"=\" is missing");
     if (!ReadValue(&values->emplace_back())) return false;
   }
-  const size_t wanted = strlen(parameters);
   if (values->size() == wanted) return true;
-  return Fail("%s takes %zu parameter%s here, not %zu", node.path, wanted, wanted == 1 ? "" : "s",
-              values->size());
+  return Fail("%s takes %zu parameter%s here, not %zu", node.path.c_str(), wanted,
+              wanted == 1 ? "" : "s", values->size());
 }
 
 bool Reader::ReadValue(Value *value) {
@@ -155,9 +250,9 @@ bool Reader::ReadValue(Value *value) {
 }
 
 bool Reader::ReadList() {
-  const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::list, "instance lists", &node)) return false;
-  if (!ReadSelector(*node, node->offers.list.types, &values_)) return false;
+  const Node *node;
+  if (!ReadNode(&Description::hasLists, "instance lists", &node)) return false;
+  if (!ReadSelector(*node, node->description.ListParameterCount(), &values_)) return false;
   KIF_Status status = 0;
   entries_.clear();
   if (TakeWord("status")) {
@@ -167,25 +262,25 @@ bool Reader::ReadList() {
       if (!ReadValue(&entries_.emplace_back())) return false;
     }
   }
-  model_->AddList(IndexOf(*node), values_, status, entries_, lineNumber_);
+  model_->AddList(node->model, values_, status, entries_, lineNumber_);
   return true;
 }
 
 bool Reader::ReadRecord() {
-  const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::record, "records", &node)) return false;
-  if (!ReadSelector(*node, node->offers.record.types, &values_)) return false;
+  const Node *node;
+  if (!ReadNode(&Description::hasRecords, "records", &node)) return false;
+  if (!ReadSelector(*node, node->description.parameterCount, &values_)) return false;
   KIF_Status status = 0;
   bytes_.clear();
   if (TakeWord("status")) {
     if (!ReadUnsigned32("status", &status)) return false;
   } else {
-    bytes_.assign(node->offers.recordSize, '\0');
+    bytes_.assign(node->description.recordSize, '\0');
     while (!AtEnd()) {
       if (!ReadPart(*node, &bytes_)) return false;
     }
   }
-  model_->AddRecord(IndexOf(*node), values_, status, bytes_, lineNumber_);
+  model_->AddRecord(node->model, values_, status, bytes_, lineNumber_);
   return true;
 }
 
@@ -204,17 +299,19 @@ bool Reader::FindPartByOffset(std::string_view name, Part *part) {
               PRINTED(name));
 }
 
-bool Reader::FindPart(const NodeInfo &node, std::string_view name, Part *part) {
+bool Reader::FindPart(const Node &node, std::string_view name, Part *part) {
   if (name.starts_with('@')) return FindPartByOffset(name.substr(1), part);
-  for (const NodeField *field = FieldsOf(node); field->name != nullptr; ++field) {
+  const NodeField *fields = node.description.fields;
+  for (const NodeField *field = fields; field < fields + node.description.fieldCount; ++field) {
     if (name != field->name) continue;
     const PartType type = field->type == FieldType::kText     ? PartType::kText
+                          : field->type == FieldType::kBytes  ? PartType::kHex
                           : field->type == FieldType::kSigned ? PartType::kSigned
                                                               : PartType::kUnsigned;
     *part = {field->offset, field->size, type};
     return true;
   }
-  return Fail("%s has no field \"%.*s\"", node.path, PRINTED(name));
+  return Fail("%s has no field \"%.*s\"", node.path.c_str(), PRINTED(name));
 }
 
 bool Reader::ReadPartText(const Part &part, std::string_view name, std::string *bytes) {
@@ -244,7 +341,7 @@ bool Reader::ReadPartNumber(const Part &part, std::string_view name, std::string
   return true;
 }
 
-bool Reader::ReadPart(const NodeInfo &node, std::string *record) {
+bool Reader::ReadPart(const Node &node, std::string *record) {
   std::string_view name = NextWord(true);
   if (!name.ends_with('=')) return Fail("\"%.*s\" is not NAME=VALUE", PRINTED(name));
   name.remove_suffix(1);
@@ -292,9 +389,9 @@ bool Reader::ReadContentWord(ContentAnswer *content, bool *hasLength, bool *hasS
 }
 
 bool Reader::ReadContent() {
-  const NodeInfo *node;
-  if (!ReadNode(&NodeOffers::content, "content", &node)) return false;
-  if (!ReadSelector(*node, node->offers.content.types, &values_)) return false;
+  const Node *node;
+  if (!ReadNode(&Description::hasContents, "content", &node)) return false;
+  if (!ReadSelector(*node, node->description.parameterCount, &values_)) return false;
   ContentAnswer content;
   bool hasLength = false;
   bool hasStatus = false;
@@ -303,15 +400,15 @@ bool Reader::ReadContent() {
   }
   if (!hasLength) content.total = static_cast<uint32_t>(content.bytes.size());
   if (hasStatus && !hasLength && content.bytes.empty()) content.lengthStatus = content.readStatus;
-  model_->AddContent(IndexOf(*node), values_, content, lineNumber_);
+  model_->AddContent(node->model, values_, content, lineNumber_);
   return true;
 }
 
 bool Reader::ReadSet() {
-  const NodeInfo *node;
+  const Node *node;
   if (!ReadNode(nullptr, "", &node)) return false;
-  if (!node->offers.settable) return Fail("%s cannot be written", node->path);
-  NodeModel &model = model_->nodes[IndexOf(*node)];
+  if (!node->description.settable) return Fail("%s cannot be written", node->path.c_str());
+  NodeModel &model = *node->model;
   if (model.setLine != 0) return Fail("the same was given in line %u", model.setLine);
   model.setLine = lineNumber_;
   if (!TakeWord("=") || !TakeWord("status")) return Fail("\"= status S\" is missing");

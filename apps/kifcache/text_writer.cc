@@ -1,7 +1,9 @@
 #include "text_writer.h"
 
 #include <cinttypes>
+#include <cstring>
 
+#include "description_text.h"
 #include "encoding.h"
 #include "record_parts.h"
 
@@ -25,8 +27,10 @@ std::string Written(const RecordPart &part) {
   if (part.field == nullptr) {
     return "@" + std::to_string(part.offset) + ":hex=" + HexDigits(part.bytes);
   }
-  const bool isText = part.field->type == FieldType::kText;
-  return std::string(part.field->name) + "=" + (isText ? Quoted(part.bytes) : Decimal(part));
+  const std::string value = part.field->type == FieldType::kText    ? Quoted(part.bytes)
+                            : part.field->type == FieldType::kBytes ? HexDigits(part.bytes)
+                                                                    : Decimal(part);
+  return std::string(part.field->name) + "=" + value;
 }
 
 }  // namespace
@@ -40,6 +44,34 @@ void TextWriter::OnHost(const Facts &facts) {
   if (facts.begin != 0) fprintf(stream_, "host begin %" PRId64 "\n", facts.begin);
   if (facts.end != 0) fprintf(stream_, "host end %" PRId64 "\n", facts.end);
   for (const std::string &text : facts.omitted) Write("host omitted " + Quoted(text) + "\n");
+  if (facts.minorVersion < kCacheMinorVersion) {
+    fprintf(stream_, "host minorVersion %u\n", facts.minorVersion);
+    return;
+  }
+  if (facts.catalogue != CatalogueHash()) {
+    fprintf(stream_, "host catalogue 0x%016" PRIx64 "\n", facts.catalogue);
+  }
+  if (facts.recorderCartel != 0) {
+    fprintf(stream_, "host recorderCartel %" PRId64 "\n", facts.recorderCartel);
+  }
+  for (const Moments &of : facts.moments) {
+    Write("host moments " + Quoted(of.name));
+    for (const int64_t moment : {of.begin, of.end, of.beginSinceBoot, of.endSinceBoot}) {
+      fprintf(stream_, " %" PRId64, moment);
+    }
+    fputc('\n', stream_);
+  }
+  for (const Lack &lack : facts.lacks) {
+    Write("host lack " + Quoted(lack.what) + " " + ReasonText(lack.reason));
+    fprintf(stream_, " status 0x%x count %" PRIu64 "\n", lack.status, lack.count);
+  }
+}
+
+// A node that this kifcache knows, and knows so, needs no words.
+void TextWriter::OnNode(const VisitedNode &node) {
+  const std::string words(node.words);
+  if (words.empty() || IsOurs(FindNodeByPath(node.path, strlen(node.path)), words)) return;
+  Write(std::string("node ") + node.path + " = " + words + "\n");
 }
 
 void TextWriter::Begin(const char *kind, const VisitedNode &node, const Values &selector) {
@@ -60,7 +92,7 @@ void TextWriter::OnRecord(const VisitedNode &node, const Values &instance, KIF_S
                           std::string_view record) {
   Begin("record", node, instance);
   if (status != 0) fprintf(stream_, " status 0x%x", status);
-  for (const RecordPart &part : PartsOf(node.info, record)) {
+  for (const RecordPart &part : PartsOf(node.description, record)) {
     if (part.bytes.find_first_not_of('\0') != part.bytes.npos) Write(" " + Written(part));
   }
   fputc('\n', stream_);

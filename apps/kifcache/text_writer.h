@@ -10,6 +10,7 @@ class TextWriter : public Visitor {
   explicit TextWriter(FILE *stream) : stream_(stream) {}
 
   void OnHost(const Facts &facts) override;
+  void OnNode(const VisitedNode &node) override;
   void OnList(const VisitedNode &node, const Values &parent, KIF_Status status,
               const Values &entries) override;
   void OnRecord(const VisitedNode &node, const Values &instance, KIF_Status status,

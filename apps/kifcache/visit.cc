@@ -1,11 +1,58 @@
 #include "visit.h"
 
+#include <algorithm>
 #include <cstring>
 
 namespace {
 
-Facts FactsOf(const cache::Recording &recording) {
+// Of moments and lacks: there are a few for each node.
+constexpr uint32_t kMostFacts = 10000;
+constexpr uint32_t kMostFactText = 1000;
+
+bool TextAt(const CacheFile &file, const cache::Bytes &bytes, std::string *text) {
+  if (!HasBytes(file, bytes.place(), bytes.length()) || bytes.length() > kMostFactText)
+    return false;
+  text->assign(reinterpret_cast<const char *>(file.bytes) + bytes.place(), bytes.length());
+  return text->find('\0') == text->npos;
+}
+
+// A struct of a vector, which need not be aligned.
+template <typename Struct>
+Struct At(const flatbuffers::Vector<const Struct *> &all, uint32_t place) {
+  Struct copy;
+  memcpy(&copy, all.Data() + place * sizeof(Struct), sizeof(Struct));
+  return copy;
+}
+
+bool AddMoments(const CacheFile &file, Facts *facts) {
+  const auto *all = file.content->recording()->moments();
+  if (all != nullptr && all->size() > kMostFacts) return false;
+  for (uint32_t i = 0; all != nullptr && i < all->size(); ++i) {
+    const cache::Moments of = At(*all, i);
+    std::string name;
+    if (!TextAt(file, of.name(), &name)) return false;
+    facts->moments.push_back(
+        {name, of.begin(), of.end(), of.begin_since_boot(), of.end_since_boot()});
+  }
+  return true;
+}
+
+bool AddLacks(const CacheFile &file, Facts *facts) {
+  const auto *all = file.content->recording()->lacks();
+  if (all != nullptr && all->size() > kMostFacts) return false;
+  for (uint32_t i = 0; all != nullptr && i < all->size(); ++i) {
+    const cache::Lack lack = At(*all, i);
+    std::string what;
+    if (!TextAt(file, lack.what(), &what)) return false;
+    facts->lacks.push_back({what, lack.reason(), lack.status(), lack.count()});
+  }
+  return true;
+}
+
+Facts FactsOf(const CacheFile &file) {
+  const cache::Recording &recording = *file.content->recording();
   Facts facts;
+  facts.minorVersion = std::min(file.header->minor_version(), kCacheMinorVersion);
   facts.name = TextOrEmpty(recording.name());
   facts.system = TextOrEmpty(recording.system());
   facts.release = TextOrEmpty(recording.release());
@@ -14,6 +61,10 @@ Facts FactsOf(const cache::Recording &recording) {
   facts.rights = TextOrEmpty(recording.rights());
   facts.kernelBuildDate = TextOrEmpty(recording.kernel_build_date());
   facts.signature = recording.signature();
+  facts.catalogue = recording.catalogue();
+  facts.redaction = TextOrEmpty(recording.redaction());
+  facts.bootID = TextOrEmpty(recording.boot_id());
+  facts.recorderCartel = recording.recorder_cartel();
   facts.begin = recording.begin();
   facts.end = recording.end();
   if (recording.omitted() != nullptr) {
@@ -26,9 +77,10 @@ class Walk {
  public:
   Walk(const CacheFile &file, Visitor *visitor) : file_(file), visitor_(visitor) {}
 
-  bool Node(const cache::Node &node);
+  bool Node(uint32_t place);
 
  private:
+  bool Describe(uint32_t place, VisitedNode *visited);
   bool Show(const VisitedNode &node, const cache::List &list);
   bool Show(const VisitedNode &node, const cache::Record &record);
   bool Show(const VisitedNode &node, const cache::Stored &stored);
@@ -40,6 +92,7 @@ class Walk {
 
   const CacheFile &file_;
   Visitor *visitor_;
+  Description description_ = {};
   Values before_;
   Values selector_;
   Values entries_;
@@ -89,7 +142,7 @@ bool Walk::Show(const VisitedNode &node, const cache::List &list) {
 }
 
 bool Walk::Show(const VisitedNode &node, const cache::Record &record) {
-  if (node.info != nullptr && record.length() > node.info->offers.recordSize) return false;
+  if (node.description != nullptr && record.length() > node.description->recordSize) return false;
   std::string_view bytes;
   if (!Decode(record.place(), record.length(), &bytes)) return false;
   visitor_->OnRecord(node, selector_, record.status(), bytes);
@@ -115,9 +168,27 @@ bool Walk::ShowAll(const VisitedNode &node, const flatbuffers::Vector<const Answ
   return true;
 }
 
-bool Walk::Node(const cache::Node &node) {
-  const VisitedNode visited = {node.path()->c_str(),
-                               FindNodeByPath(node.path()->c_str(), node.path()->size())};
+bool Walk::Describe(uint32_t place, VisitedNode *visited) {
+  const flatbuffers::String &path = *file_.content->nodes()->Get(place)->path();
+  visited->path = path.c_str();
+  if (file_.header->minor_version() == 0) {
+    const NodeInfo *known = FindNodeByPath(path.c_str(), path.size());
+    if (known != nullptr) ::Describe(*known, &description_);
+    visited->description = known != nullptr ? &description_ : nullptr;
+    return true;
+  }
+  if (!ReadDescriptionAt(file_, place, &description_)) return false;
+  const cache::Bytes &words = *file_.content->descriptions()->Get(place);
+  visited->description = &description_;
+  visited->words = {reinterpret_cast<const char *>(file_.bytes) + words.place(), words.length()};
+  return true;
+}
+
+bool Walk::Node(uint32_t place) {
+  const cache::Node &node = *file_.content->nodes()->Get(place);
+  VisitedNode visited = {};
+  if (!Describe(place, &visited)) return false;
+  visitor_->OnNode(visited);
   if (!ShowAll(visited, node.lists()) || !ShowAll(visited, node.records()) ||
       !ShowAll(visited, node.contents())) {
     return false;
@@ -129,13 +200,18 @@ bool Walk::Node(const cache::Node &node) {
 }  // namespace
 
 bool VisitAll(const CacheFile &file, Visitor *visitor, std::string *problem) {
-  visitor->OnHost(FactsOf(*file.content->recording()));
+  Facts facts = FactsOf(file);
+  if (!AddMoments(file, &facts) || !AddLacks(file, &facts)) {
+    *problem = "the recording";
+    return false;
+  }
+  visitor->OnHost(facts);
   Walk walk(file, visitor);
   const char *before = nullptr;
   const auto *nodes = file.content->nodes();
   for (uint32_t i = 0; nodes != nullptr && i < nodes->size(); ++i) {
     const char *path = nodes->Get(i)->path()->c_str();
-    if ((before != nullptr && strcmp(before, path) >= 0) || !walk.Node(*nodes->Get(i))) {
+    if ((before != nullptr && strcmp(before, path) >= 0) || !walk.Node(i)) {
       *problem = path;
       return false;
     }

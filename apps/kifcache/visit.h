@@ -7,16 +7,19 @@
 #include "cache_file.h"
 #include "host_model.h"
 
-// A node of the file. `info` is null where this kifcache does not know it.
+// A node of the file. `description` is the file's own; a file of version 1.0 has none, and it is
+// the catalogue's, or null where that does not have the node.
 struct VisitedNode {
   const char *path;
-  const NodeInfo *info;
+  const Description *description;
+  std::string_view words;  // the file's own description in words
 };
 
 class Visitor {
  public:
   virtual ~Visitor() = default;
   virtual void OnHost(const Facts &facts) = 0;
+  virtual void OnNode(const VisitedNode &) {}  // before its answers
   virtual void OnList(const VisitedNode &node, const Values &parent, KIF_Status status,
                       const Values &entries) = 0;
   // `record` is without the zeros at its end.

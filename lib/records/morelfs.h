@@ -11,9 +11,6 @@ struct __attribute__((packed)) TardiskStats {
   uint32_t usedToBoot;  // lowest byte not 0: one of the modules that the host was booted from
   uint8_t unused12[16];
 };
-static_assert(sizeof(TardiskStats) == 28);
-static_assert(offsetof(TardiskStats, used) == 0);
-static_assert(offsetof(TardiskStats, usedToBoot) == 8);
 
 struct __attribute__((packed)) RamdiskStats {
   uint32_t minimum;   // MiB
@@ -22,11 +19,6 @@ struct __attribute__((packed)) RamdiskStats {
   uint32_t peakUsed;  // pages
   uint8_t unused16[164];
 };
-static_assert(sizeof(RamdiskStats) == 180);
-static_assert(offsetof(RamdiskStats, minimum) == 0);
-static_assert(offsetof(RamdiskStats, maximum) == 4);
-static_assert(offsetof(RamdiskStats, used) == 8);
-static_assert(offsetof(RamdiskStats, peakUsed) == 12);
 
 enum InodeFlags : uint32_t {
   kInodeOnTardisk = 0x1,   // else on a ramdisk
@@ -46,10 +38,3 @@ struct __attribute__((packed)) InodeStats {
   char ramdisk[128];
   char name[256];
 };
-static_assert(sizeof(InodeStats) == 544);
-static_assert(offsetof(InodeStats, flags) == 4);
-static_assert(offsetof(InodeStats, linkState) == 20);
-static_assert(offsetof(InodeStats, size) == 28);
-static_assert(offsetof(InodeStats, tardisk) == 32);
-static_assert(offsetof(InodeStats, ramdisk) == 160);
-static_assert(offsetof(InodeStats, name) == 288);

@@ -23,22 +23,6 @@ struct __attribute__((packed)) PciConfigHeader {
   int32_t physSlot;
   uint8_t unused60[68];
 };
-static_assert(sizeof(PciConfigHeader) == 128);
-static_assert(offsetof(PciConfigHeader, vendorID) == 0);
-static_assert(offsetof(PciConfigHeader, deviceID) == 2);
-static_assert(offsetof(PciConfigHeader, subVendorID) == 4);
-static_assert(offsetof(PciConfigHeader, subDeviceID) == 6);
-static_assert(offsetof(PciConfigHeader, classCode) == 8);
-static_assert(offsetof(PciConfigHeader, isaIrq) == 12);
-static_assert(offsetof(PciConfigHeader, irq) == 13);
-static_assert(offsetof(PciConfigHeader, vector) == 14);
-static_assert(offsetof(PciConfigHeader, intPin) == 15);
-static_assert(offsetof(PciConfigHeader, spawnedBus) == 16);
-static_assert(offsetof(PciConfigHeader, infoFlags) == 17);
-static_assert(offsetof(PciConfigHeader, mFlags) == 18);
-static_assert(offsetof(PciConfigHeader, moduleID) == 19);
-static_assert(offsetof(PciConfigHeader, name) == 23);
-static_assert(offsetof(PciConfigHeader, physSlot) == 56);
 
 // Bits of PciConfigHeader::infoFlags.
 constexpr uint8_t kPciInterruptValid = 1;   // isaIrq, irq, vector and intPin hold something
@@ -49,18 +33,13 @@ constexpr uint32_t kNoModule = 0xFFFFFFFF;
 struct __attribute__((packed)) PciConfigSpace {
   uint8_t bytes[256];
 };
-static_assert(sizeof(PciConfigSpace) == 256);
 
 struct __attribute__((packed)) PciExtConfigSpace {
   uint8_t bytes[4096];
 };
-static_assert(sizeof(PciExtConfigSpace) == 4096);
 
 struct __attribute__((packed)) ModuleRecord {
   char name[288];
   uint32_t moduleID;
   uint8_t unused292[408];
 };
-static_assert(sizeof(ModuleRecord) == 700);
-static_assert(offsetof(ModuleRecord, name) == 0);
-static_assert(offsetof(ModuleRecord, moduleID) == 288);

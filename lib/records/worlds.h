@@ -19,12 +19,6 @@ struct __attribute__((packed)) WorldInfo {
   int32_t securityDomain;
   unsigned char unused49[23];
 };
-static_assert(sizeof(WorldInfo) == 72);
-static_assert(offsetof(WorldInfo, worldID) == 0 && offsetof(WorldInfo, groupID) == 4 &&
-              offsetof(WorldInfo, userspaceID) == 8 && offsetof(WorldInfo, cartelID) == 12 &&
-              offsetof(WorldInfo, parentCartelID) == 16 &&
-              offsetof(WorldInfo, processGroupID) == 20 && offsetof(WorldInfo, sessionID) == 24 &&
-              offsetof(WorldInfo, worldType) == 28 && offsetof(WorldInfo, securityDomain) == 45);
 
 enum WorldType : uint32_t {
   kWorldTypeSystem = 0x1,
@@ -41,7 +35,6 @@ enum WorldType : uint32_t {
 struct __attribute__((packed)) WorldName {
   char name[128];
 };
-static_assert(sizeof(WorldName) == 128);
 
 // KIF_NODE_sched_Vcpus_stats_summaryStats, for a world ID. The states are places in the library's
 // state tables.
@@ -51,15 +44,12 @@ struct __attribute__((packed)) SchedSummary {
   uint32_t waitState;
   unsigned char unused12[236];
 };
-static_assert(sizeof(SchedSummary) == 248);
-static_assert(offsetof(SchedSummary, runState) == 4 && offsetof(SchedSummary, waitState) == 8);
 
 // KIF_NODE_sched_Vcpus_stats_affinity, for a world ID. The text has no length of its own: it may
 // fill the record.
 struct __attribute__((packed)) SchedAffinity {
   char cpuText[2304];
 };
-static_assert(sizeof(SchedAffinity) == 2304);
 
 // KIF_NODE_sched_Vcpus_stats_stateTimes, for a world ID.
 struct __attribute__((packed)) SchedStateTimes {
@@ -67,15 +57,12 @@ struct __attribute__((packed)) SchedStateTimes {
   uint64_t usedTime;  // in microseconds
   unsigned char unused16[104];
 };
-static_assert(sizeof(SchedStateTimes) == 120);
-static_assert(offsetof(SchedStateTimes, usedTime) == 8);
 
 // KIF_NODE_userworld_cartel_cmdline, for a cartel ID: the program and its arguments, separated by
 // blanks.
 struct __attribute__((packed)) CartelCommandLine {
-  char text[1024];
+  char cmdline[1024];
 };
-static_assert(sizeof(CartelCommandLine) == 1024);
 
 // KIF_NODE_userworld_cartel_child, for a cartel ID and one of its child cartel IDs.
 struct __attribute__((packed)) ChildRecord {
@@ -83,8 +70,6 @@ struct __attribute__((packed)) ChildRecord {
   int32_t childState;  // kChildStateZombie, or anything else
   unsigned char unused8[20];
 };
-static_assert(sizeof(ChildRecord) == 28);
-static_assert(offsetof(ChildRecord, childState) == 4);
 
 constexpr int32_t kChildStateZombie = 1;
 
@@ -94,9 +79,6 @@ struct __attribute__((packed)) DescriptorRecord {
   char kind[96];
   char description[1984];
 };
-static_assert(sizeof(DescriptorRecord) == 2084);
-static_assert(offsetof(DescriptorRecord, kind) == 4 &&
-              offsetof(DescriptorRecord, description) == 100);
 
 // KIF_NODE_userworld_cartel_mem_mmaps, for a cartel ID and a mapping of its list.
 struct __attribute__((packed)) MappingRecord {
@@ -108,11 +90,6 @@ struct __attribute__((packed)) MappingRecord {
   int32_t descriptor;
   char description[2008];
 };
-static_assert(sizeof(MappingRecord) == 2036);
-static_assert(offsetof(MappingRecord, length) == 8 && offsetof(MappingRecord, kind) == 16 &&
-              offsetof(MappingRecord, protection) == 20 &&
-              offsetof(MappingRecord, descriptor) == 24 &&
-              offsetof(MappingRecord, description) == 28);
 
 constexpr uint32_t kMappingOfFile = 2;
 constexpr uint32_t kMappingReadable = 0x1;

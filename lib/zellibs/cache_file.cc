@@ -96,3 +96,47 @@ const char *ParameterText(const CacheFile &file, const cache::Parameter &paramet
   const uint8_t *text = file.bytes + place;
   return text[parameter.length()] == 0 ? reinterpret_cast<const char *>(text) : nullptr;
 }
+
+bool ReadDescriptionAt(const CacheFile &file, uint32_t place, Description *description) {
+  const auto *all = file.content->descriptions();
+  if (all == nullptr || place >= all->size()) return false;
+  const cache::Bytes &text = *all->Get(place);
+  return HasBytes(file, text.place(), text.length()) &&
+         ReadDescription(reinterpret_cast<const char *>(file.bytes) + text.place(), text.length(),
+                         description);
+}
+
+bool HasSameCatalogue(const CacheFile &file) {
+  const cache::Recording &facts = *file.content->recording();
+  return file.header->minor_version() == 0 ? facts.signature() == kSignatureOfVersion1_0
+                                           : facts.catalogue() == CatalogueHash();
+}
+
+bool FitsCatalogue(const CacheFile &file, CatalogueConflictTeller tell, void *context) {
+  if (file.header->minor_version() == 0) return HasSameCatalogue(file);
+  struct Told {
+    const char *path;
+    CatalogueConflictTeller tell;
+    void *context;
+  };
+  const auto tellOfNode = [](const char *what, void *given) {
+    const auto *told = static_cast<Told *>(given);
+    if (told->tell != nullptr) told->tell(told->path, what, told->context);
+  };
+  bool fits = true;
+  const auto *nodes = file.content->nodes();
+  for (uint32_t i = 0; nodes != nullptr && i < nodes->size(); ++i) {
+    const flatbuffers::String *path = nodes->Get(i)->path();
+    const NodeInfo *node = FindNodeByPath(path->c_str(), path->size());
+    if (node == nullptr) continue;
+    Told told = {node->path, tell, context};
+    Description description;
+    if (!ReadDescriptionAt(file, i, &description)) {
+      fits = false;
+      tellOfNode("description", &told);
+    } else {
+      fits = Fits(*node, description, tellOfNode, &told) && fits;
+    }
+  }
+  return fits;
+}

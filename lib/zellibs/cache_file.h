@@ -7,12 +7,13 @@
 #include <cstdint>
 
 #include "cache_generated.h"
+#include "description.h"
 #include "file_bytes.h"
 #include "nodes.h"
 #include "zellibs.h"
 
 constexpr uint16_t kCacheMajorVersion = 1;
-constexpr uint16_t kCacheMinorVersion = 0;
+constexpr uint16_t kCacheMinorVersion = 1;
 
 // An open cache file; all zero: none. Everything points into the mapped file.
 struct CacheFile {
@@ -42,6 +43,22 @@ bool HasBytes(const CacheFile &file, uint32_t place, uint32_t length);
 
 // The zero-ended text of a parameter of kind Text; null where it does not lie within the file.
 const char *ParameterText(const CacheFile &file, const cache::Parameter &parameter);
+
+// The description of the file's node number `place`; false where it has none. Version 1.0 has none.
+bool ReadDescriptionAt(const CacheFile &file, uint32_t place, Description *description);
+
+// Told of a conflict in a node's description; see Fits (description.h).
+using CatalogueConflictTeller = void (*)(const char *path, const char *what, void *context);
+
+// Whether the file's answers can be read as those of the nodes that this catalogue knows; visits
+// the descriptions. `tell` may be null.
+bool FitsCatalogue(const CacheFile &file, CatalogueConflictTeller tell, void *context);
+
+// The same in one look, where recorder and reader have the same catalogue.
+bool HasSameCatalogue(const CacheFile &file);
+
+// Version 1.0 says by the signature alone what its records look like, and there is one with it.
+constexpr uint64_t kSignatureOfVersion1_0 = 0x7dc27bb44c95f944;
 
 // A text of the file that may be missing.
 inline const char *TextOrEmpty(const flatbuffers::String *text) {

@@ -12,6 +12,7 @@ namespace {
 struct Choice {
   bool made;
   bool live;
+  bool foreign;
   KIF_Status status;
   const Host *host;
 };
@@ -28,19 +29,19 @@ const char *HostName() {
 Choice ChooseByEnvironment() {
   const char *name = HostName();
   if (name == nullptr || name[0] == '\0' || strcmp(name, kLinux) == 0) {
-    return {true, true, KIF_STATUS_OK, &kLinuxHost};
+    return {true, true, false, KIF_STATUS_OK, &kLinuxHost};
   }
   if (strncmp(name, kLinux, kLinuxLength) == 0 && name[kLinuxLength] == ':') {
     const char *root = name + kLinuxLength + 1;
     // A script's variable that is not set must not turn a stranger's tree into this machine.
-    if (root[0] == '\0') return {true, true, KIF_STATUS_BAD_PARAMETER, nullptr};
+    if (root[0] == '\0') return {true, true, true, KIF_STATUS_BAD_PARAMETER, nullptr};
     SetLinuxRoot(root);
-    return {true, true, KIF_STATUS_OK, &kLinuxHost};
+    return {true, true, true, KIF_STATUS_OK, &kLinuxHost};
   }
-  if (strcmp(name, "none") == 0) return {true, false, KIF_STATUS_NO_HOST, nullptr};
+  if (strcmp(name, "none") == 0) return {true, false, false, KIF_STATUS_NO_HOST, nullptr};
   const Host *recorded = nullptr;
   const KIF_Status status = OpenRecordedHost(name, &recorded);
-  return {true, true, status, recorded};
+  return {true, true, true, status, recorded};
 }
 
 const Choice &Chosen() {
@@ -57,6 +58,10 @@ KIF_Status CurrentHost(const Host **host) {
 
 bool HasLiveHost() {
   return Chosen().live;
+}
+
+bool IsForeignHost() {
+  return Chosen().foreign;
 }
 
 bool TellOfUnusableHost() {
@@ -76,6 +81,6 @@ KIF_Status UseRecordedHost(const char *path) {
   const bool live = Chosen().live;  // before the file is opened: this may open another one
   const Host *recorded = nullptr;
   const KIF_Status status = OpenRecordedHost(path, &recorded);
-  if (status == KIF_STATUS_OK) choice = {true, live, status, recorded};
+  if (status == KIF_STATUS_OK) choice = {true, live, true, status, recorded};
   return status;
 }

@@ -11,7 +11,7 @@
 // offers what is asked of it, and `instance` (null: none) holds any parameters at all: a host
 // checks their number and types itself.
 struct Host {
-  // Fills `record`, node.offers.recordSize bytes that are zero before the call.
+  // Fills `record`, node.recordSize bytes that are zero before the call.
   KIF_Status (*getRecord)(const NodeInfo &node, const KIF_ParamList *instance, void *record);
 
   // Appends the instances below `parent` to `list`, which is empty before the call.
@@ -40,6 +40,9 @@ KIF_Status CurrentHost(const Host **host);
 
 // Whether there is a host to be live on, be it one that cannot be read.
 bool HasLiveHost();
+
+// Whether the host is not the machine that this process runs on.
+bool IsForeignHost();
 
 // Whether the live host is one that cannot be read, a file that is none; says so on standard error
 // in a line: file and reason. Such a name is mostly mistyped.

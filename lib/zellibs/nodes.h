@@ -1,5 +1,4 @@
-// The table of nodes: the only place that knows what nodes there are. The node variables, the
-// interface signature and kifcache are made from it.
+// The table of nodes, as nodes.def lists them.
 #pragma once
 
 #include <cstddef>
@@ -7,14 +6,17 @@
 
 enum class FieldType : uint8_t {
   kUnsigned,  // little-endian, 1, 2, 4 or 8 bytes
-  kSigned,    // little-endian, 4 bytes
+  kSigned,    // the same, in two's complement
   kText,      // ends at its first NUL, or at the end of the field
+  kBytes,
 };
 
+// Names are in the tables themselves: these are mapped as they are, and a process that starts has
+// nothing of them to relocate.
 struct NodeField {
-  const char *name;  // null ends a list of fields
-  uint32_t offset;   // in bytes from the start of the record
-  uint32_t size;     // in bytes
+  char name[32];
+  uint32_t offset;  // in bytes from the start of the record
+  uint32_t size;    // in bytes
   FieldType type;
 };
 
@@ -29,63 +31,59 @@ enum class Instances : uint8_t {
   kOwnListIndex,  // the places 0 to count - 1 of the node's own instance lists
 };
 
-// The types ('i' integer, 's' text) of the parameters that select an answer, where there are
-// answers at all.
-struct ParameterTypes {
-  bool offered = false;
-  char types[5] = "";
+enum ParameterType : char { kInteger = 'i', kText = 's' };
 
-  constexpr ParameterTypes() = default;
-  template <size_t Size>
-  constexpr ParameterTypes(const char (&given)[Size]) : offered(true) {
-    static_assert(Size <= sizeof(types));
-    for (size_t i = 0; i < Size; ++i) types[i] = given[i];
-  }
+struct ParameterInfo {
+  char name[16];
+  ParameterType type;
 };
 
-// What a node offers.
-struct NodeOffers {
-  ParameterTypes list = {};  // instance lists, by the instance above them
-  ParameterTypes record = {};
-  uint32_t recordSize = 0;  // in bytes
-  ParameterTypes content = {};
-  bool settable = false;
-  Instances instances = Instances::kNone;
-
-  constexpr NodeOffers AndRecords(const ParameterTypes &parameters, uint32_t size,
-                                  Instances found) const {
-    NodeOffers offers = *this;
-    offers.record = parameters;
-    offers.recordSize = size;
-    offers.instances = found;
-    return offers;
-  }
-  constexpr NodeOffers AndSettable() const {
-    NodeOffers offers = *this;
-    offers.settable = true;
-    return offers;
-  }
+enum class Group : uint8_t {
+#define GROUP(name) name,
+#include "nodes.def"
 };
 
-// Without pointers, so that the table is mapped as it is and a process that starts has nothing of
-// it to relocate.
+constexpr size_t kMostParameters = 8;
+
 struct NodeInfo {
   char path[72];
-  NodeOffers offers;
+  Group group;
+  bool hasVariable;  // the tools know it: its record never changes
+  bool hasLists;
+  bool hasRecords;
+  bool hasContents;
+  bool settable;
+  Instances instances;
+  uint8_t parameterCount;
+  uint8_t parameters[kMostParameters];  // places in kParameters
+  uint16_t fieldCount;
+  uint16_t firstField;  // place in kFields
+  uint32_t recordSize;  // in bytes
 };
 
 // The places of the nodes in the table, kNode_<path>; the number of a node is its place plus 1.
 enum NodeIndex : uint16_t {
 #define NODE(path, ...) kNode_##path,
 #include "nodes.def"
-#undef NODE
   kNodeCount
 };
 
 extern const NodeInfo kNodes[kNodeCount];
+extern const ParameterInfo kParameters[];
 
-// The named fields of a node's record, ended by one without a name.
+// How many parameters select an instance list of a node, and a record or content.
+inline size_t CountOfListParameters(const NodeInfo &node) {
+  return node.hasLists ? size_t{node.parameterCount} - 1 : 0;
+}
+inline const ParameterInfo &ParameterOf(const NodeInfo &node, size_t place) {
+  return kParameters[node.parameters[place]];
+}
+
+// The named fields of a node's record: node.fieldCount of them.
 const NodeField *FieldsOf(const NodeInfo &node);
+
+// The word for a group of nodes.
+const char *GroupName(Group group);
 
 // The node with the number `node`, or null.
 const NodeInfo *FindNode(uint32_t node);
@@ -98,8 +96,15 @@ inline NodeIndex IndexOf(const NodeInfo &node) {
 // The node with a path of `length` bytes, or null.
 const NodeInfo *FindNodeByPath(const char *path, size_t length);
 
-// A hash over every row of the table: two libraries with the same one agree on every record.
+// A hash over the nodes of the tools: two libraries with the same one agree on every record that a
+// tool asks for.
 uint64_t InterfaceSignature();
+constexpr uint64_t kSignatureOfInterfaceDate = 0x7dc27bb44c95f944;
+
+// A hash over every row, group and parameter. Asked for by a number that no node can have, a
+// library of ours gives its own, so that a recorder knows that both number their nodes alike.
+uint64_t CatalogueHash();
+constexpr uint32_t kCatalogueNumber = 0x4B494643;
 
 // When the interface last changed: 20 characters, as the kernel writes a date.
 extern const char kInterfaceDate[21];

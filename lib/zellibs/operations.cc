@@ -13,8 +13,8 @@
 #include "zellibs.h"
 
 #define NODE(path, ...) const KIF_NodeId KIF_NODE_##path = kNode_##path + 1;
+#define BEYOND(...)
 #include "nodes.def"
-#undef NODE
 
 #define STATE(place, name) {{0, 0}, name},
 const CpuSched_StateElement CpuSched_RunStateElements[] = {
@@ -34,13 +34,21 @@ KIF_Status FindNodeAndHost(uint32_t number, const NodeInfo **node, const Host **
   return *node != nullptr ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
 }
 
+KIF_Status GetCatalogueHash(void *buffer, uint32_t size) {
+  const uint64_t hash = CatalogueHash();
+  if (buffer == nullptr || size != sizeof(hash)) return KIF_STATUS_BAD_PARAMETER;
+  memcpy(buffer, &hash, sizeof(hash));
+  return KIF_STATUS_OK;
+}
+
 KIF_Status GetRecord(uint32_t number, const KIF_ParamList *instance, void *buffer, uint32_t size) {
   const NodeInfo *node;
   const Host *host;
+  if (number == kCatalogueNumber) return GetCatalogueHash(buffer, size);
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (!node->offers.record.offered) return KIF_STATUS_NOT_SUPPORTED;
-  if (buffer == nullptr || size < node->offers.recordSize) return KIF_STATUS_BAD_PARAMETER;
+  if (!node->hasRecords) return KIF_STATUS_NOT_SUPPORTED;
+  if (buffer == nullptr || size < node->recordSize) return KIF_STATUS_BAD_PARAMETER;
   memset(buffer, 0, size);
   return host->getRecord(*node, instance, buffer);
 }
@@ -50,7 +58,7 @@ KIF_Status GetInstances(uint32_t number, const KIF_ParamList *parent, KIF_ParamL
   const Host *host;
   KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (!node->offers.list.offered) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->hasLists) return KIF_STATUS_NOT_SUPPORTED;
   if (list == nullptr) return KIF_STATUS_BAD_PARAMETER;
   KIF_ParamList *instances = KIF_ParamListCreate(KIF_PARAMLIST_INSTANCE, 0);
   if (instances == nullptr) return KIF_STATUS_NO_MEMORY;
@@ -70,7 +78,7 @@ KIF_Status GetContentLength(uint32_t number, const KIF_ParamList *instance, uint
   *length = 0;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (!node->offers.content.offered) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->hasContents) return KIF_STATUS_NOT_SUPPORTED;
   return host->getContentLength(*node, instance, length);
 }
 
@@ -80,7 +88,7 @@ KIF_Status GetContent(uint32_t number, const KIF_ParamList *instance, KIFData *i
   const Host *host;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (!node->offers.content.offered) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->hasContents) return KIF_STATUS_NOT_SUPPORTED;
   ContentRequest request;
   if (input == nullptr || output == nullptr || DataOf(input)->length < sizeof(request)) {
     return KIF_STATUS_BAD_PARAMETER;
@@ -97,7 +105,7 @@ KIF_Status Set(uint32_t number, const KIF_ParamList *instance, const KIF_ParamLi
   const Host *host;
   const KIF_Status status = FindNodeAndHost(number, &node, &host);
   if (status != KIF_STATUS_OK) return status;
-  if (!node->offers.settable) return KIF_STATUS_NOT_SUPPORTED;
+  if (!node->settable) return KIF_STATUS_NOT_SUPPORTED;
   return host->set(*node, instance, input);
 }
 
@@ -182,4 +190,10 @@ bool HostType_OSIsSimulator() {
   const bool simulator = HasLiveHost();
   TraceCall("HostType_OSIsSimulator", nullptr, simulator ? 1 : 0);
   return simulator;
+}
+
+bool KIF_HostIsForeign() {
+  const bool foreign = IsForeignHost();
+  TraceCall("KIF_HostIsForeign", nullptr, foreign ? 1 : 0);
+  return foreign;
 }

@@ -102,11 +102,13 @@ KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *
   const KIF_Status status = Find(answers->node->records(), instance, &answers->recordHint, &answer);
   if (status != KIF_STATUS_OK) return status;
   if (answer->status() != KIF_STATUS_OK) return answer->status();
-  if (answer->length() > node.offers.recordSize ||
-      !HasBytes(recording, answer->place(), answer->length())) {
+  // Beyond the tools a record may have grown since.
+  uint32_t length = answer->length();
+  if (length > node.recordSize && !node.hasVariable) length = node.recordSize;
+  if (length > node.recordSize || !HasBytes(recording, answer->place(), answer->length())) {
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
-  if (answer->length() > 0) memcpy(record, recording.bytes + answer->place(), answer->length());
+  if (length > 0) memcpy(record, recording.bytes + answer->place(), length);
   return KIF_STATUS_OK;
 }
 
@@ -189,7 +191,7 @@ KIF_Status CheckSignature(char *date, bool *matches) {
   const cache::Recording *facts = recording.content->recording();
   strncpy(date, TextOrEmpty(facts->kernel_build_date()), sizeof(kInterfaceDate) - 1);
   date[sizeof(kInterfaceDate) - 1] = '\0';
-  *matches = facts->signature() == InterfaceSignature();
+  *matches = HasSameCatalogue(recording) || FitsCatalogue(recording, nullptr, nullptr);
   return KIF_STATUS_OK;
 }
 

@@ -105,8 +105,8 @@ TEST_F(Recording, EndsOnAHostWithoutEnd) {
              "list system_bootOptionFiles = \"huge\"\n"
              "content system_bootOptionFiles_content \"huge\" = length 4294967295\n"));
   for (const char *said :
-       {"host omitted \"hardware_interrupts_cookieList_PCPU: 68717379568 answers\"\n",
-        "host omitted \"system_bootOptionFiles_content: 1 answer\"\n",
+       {"host lack \"hardware_interrupts_cookieList_PCPU\" limits status 0x0 count 68717379568\n",
+        "host lack \"system_bootOptionFiles_content\" limits status 0x0 count 1\n",
         "\"huge\" = length 4294967295 status 0xbad0011\n"}) {
     EXPECT_NE(recorded.find(said), recorded.npos) << said << recorded;
   }
@@ -140,7 +140,7 @@ TEST_F(Recording, OfNoHostIsRefused) {
     return Run({kKifcache, "record", file_}, {.environment = {"ZELLIBS_HOST=" + host}}).err;
   };
   EXPECT_EQ(message("none"), "kifcache: there is no host to record\n");
-  EXPECT_EQ(message(Record("host signature 0x1\n")),
+  EXPECT_EQ(message(Record("host minorVersion 0\nhost signature 0x1\n")),
             "kifcache: the host cannot be recorded: Failure\n");
   EXPECT_NE(access(file_.c_str(), F_OK), 0);
 }

@@ -19,7 +19,7 @@ namespace {
 class SignatureCounter {
  public:
   // Counts `signature` in; `*before` is how often it had come up before. False without memory.
-  bool Count(const char (&signature)[kAcpiSignatureLength + 1], int *before) {
+  bool Count(const char (&signature)[kAcpiSignatureLength], int *before) {
     size_t i = 0;
     while (i < entries_.size() && memcmp(entries_[i].signature, signature, sizeof(signature)) != 0)
       ++i;
@@ -34,7 +34,7 @@ class SignatureCounter {
 
  private:
   struct Entry {
-    char signature[kAcpiSignatureLength + 1];
+    char signature[kAcpiSignatureLength];
     int count;
   };
 
@@ -79,9 +79,9 @@ bool CreateFile(const TableBuffer &record, SignatureCounter *counter, OutputFile
   if (!counter->Count(record.signature, &before)) return FailWithErrno();
   char name[32];
   if (before != 0) {
-    snprintf(name, sizeof(name), "%s-%d.aml", record.signature, before);
+    snprintf(name, sizeof(name), "%.4s-%d.aml", record.signature, before);
   } else {
-    snprintf(name, sizeof(name), "%s.aml", record.signature);
+    snprintf(name, sizeof(name), "%.4s.aml", record.signature);
   }
   printf("Writing file %s\n", Shown(name).text());
   if (strchr(name, '/') != nullptr) {
@@ -97,7 +97,6 @@ bool DumpBuffer(KIF_ParamList *table, int32_t number, SignatureCounter *counter,
   static TableBuffer record;
   if (KIF_ParamListAddInt(table, number) != 0) return false;
   if (ReadRecord(KIF_NODE_hardware_acpi_tables_buffers, table, &record) != 0) return false;
-  FieldText(record.signature);
   if (record.length > sizeof(record.data)) {
     fprintf(stderr, "amldump: a buffer of %u bytes does not fit its record\n", record.length);
     return false;

@@ -225,12 +225,12 @@ bool PrintCommandLine(const Request &request) {
   if (request.pxe || request.kernel || request.options) {
     if (ReadRecord(KIF_NODE_system_bootCmdLine, nullptr, &line) != 0) return false;
     if (request.pxe && !PrintPxe(request)) return false;
-    options = strchr(FieldText(line.text), ' ');
+    options = strchr(FieldText(line.commandLine), ' ');
     if (options != nullptr) *options++ = '\0';
   }
   if (request.kernel) {
     PrintLabel(request, "Kernel : ");
-    printf("%s\n", Shown(line.text).text());
+    printf("%s\n", Shown(line.commandLine).text());
   }
   if (request.allContents && !PrintAllContents(request)) return false;
   if (request.options) {

@@ -30,7 +30,7 @@ KIF_Status MatchCartels(const Pattern &pattern, bool wholeLine, CartelVisitor vi
     status = ReadRecord(KIF_NODE_userworld_cartel_cmdline, selector.get(), &commandLine);
     if (status == KIF_STATUS_NO_COMMAND_LINE) continue;
     if (status != 0) return status;
-    char *text = FieldText(commandLine.text);
+    char *text = FieldText(commandLine.cmdline);
     if (!wholeLine) CutAtBlank(text);
     const bool matches = regexec(&pattern.expression, text, 0, nullptr, 0) == 0;
     status = visit({text, matches, cartels.get(), walk.index()}, context);

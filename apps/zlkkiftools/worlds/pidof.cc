@@ -59,7 +59,7 @@ bool PrintIfRunning(uint32_t cartelID, InstanceWalk *walk, KIF_ParamList *select
   if (cartelID == 0 || walk->Replace(int64_t{cartelID}) != 0) return false;
   CartelCommandLine commandLine = {};
   if (ReadRecord(KIF_NODE_userworld_cartel_cmdline, selector, &commandLine) != 0) return false;
-  if (!RunsProgram(FieldText(commandLine.text), name, options)) return false;
+  if (!RunsProgram(FieldText(commandLine.cmdline), name, options)) return false;
   if (IsOmitted(cartelID, options)) return false;
   printf("%d ", static_cast<int32_t>(cartelID));
   return true;

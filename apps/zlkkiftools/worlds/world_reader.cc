@@ -134,7 +134,7 @@ bool ReadCommandLine(Reader *reader, InstanceWalk *walk, WorldRecord *record) {
   const char *text = "<unavailable>";
   if (walk->Replace(record->cartelID) == 0 &&
       ReadRecord(KIF_NODE_userworld_cartel_cmdline, walk->selector(), &commandLine) == 0) {
-    text = FieldText(commandLine.text);
+    text = FieldText(commandLine.cmdline);
   }
   if (!reader->inventory->texts.Add(text, reader->lastCommandLine, &record->commandLine)) {
     return NoMemory();

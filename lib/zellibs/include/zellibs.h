@@ -94,60 +94,20 @@ KIF_Status KIF_CheckSig(char *kernelBuildDate, uint32_t size, const char **progr
 bool HostType_OSIsZLK(void);
 bool HostType_OSIsSimulator(void);
 
+// Whether the live host is not the machine that this process runs on: a file or a tree of files.
+// A library need not have it: callers take it as a weak symbol.
+bool KIF_HostIsForeign(void);
+
 // Constant text for a status; never null.
 const char *ZLK_ReturnStatusToString(KIF_Status status);
 
 extern const CpuSched_StateElement CpuSched_RunStateElements[];
 extern const CpuSched_StateElement CpuSched_WaitStateElements[];
 
-extern const KIF_NodeId KIF_NODE_system_ntpclock_upTime;
-extern const KIF_NodeId KIF_NODE_sched_globalStats_numPcpus;
-extern const KIF_NodeId
-    KIF_NODE_sched_groups_stats_cpuStatsDir_cpuLoadHistory_cpuLoadHistory1MinInPct;
-extern const KIF_NodeId
-    KIF_NODE_sched_groups_stats_cpuStatsDir_cpuLoadHistory_cpuLoadHistory5MinInPct;
-extern const KIF_NodeId
-    KIF_NODE_sched_groups_stats_cpuStatsDir_cpuLoadHistory_cpuLoadHistory15MinInPct;
-extern const KIF_NodeId KIF_NODE_world;
-extern const KIF_NodeId KIF_NODE_world_name;
-extern const KIF_NodeId KIF_NODE_world_info;
-extern const KIF_NodeId KIF_NODE_sched_Vcpus_stats_summaryStats;
-extern const KIF_NodeId KIF_NODE_sched_Vcpus_stats_affinity;
-extern const KIF_NodeId KIF_NODE_sched_Vcpus_stats_stateTimes;
-extern const KIF_NodeId KIF_NODE_userworld_cartel;
-extern const KIF_NodeId KIF_NODE_userworld_cartel_cmdline;
-extern const KIF_NodeId KIF_NODE_userworld_cartel_child;
-extern const KIF_NodeId KIF_NODE_userworld_cartel_fd_fds;
-extern const KIF_NodeId KIF_NODE_userworld_cartel_mem_mmaps;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus_slot;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus_slot_func;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus_slot_func_pciConfigHeader;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus_slot_func_pciConfigSpace;
-extern const KIF_NodeId KIF_NODE_hardware_pci_seg_bus_slot_func_pciExtConfigSpace;
-extern const KIF_NodeId KIF_NODE_system_modules;
-extern const KIF_NodeId KIF_NODE_system_modules_general;
-extern const KIF_NodeId KIF_NODE_hardware_chipset_rtc;
-extern const KIF_NodeId KIF_NODE_system_version;
-extern const KIF_NodeId KIF_NODE_system_bootOption;
-extern const KIF_NodeId KIF_NODE_system_bootCmdLine;
-extern const KIF_NodeId KIF_NODE_system_bootMAC;
-extern const KIF_NodeId KIF_NODE_system_bootOptionFiles;
-extern const KIF_NodeId KIF_NODE_system_bootOptionFiles_content;
-extern const KIF_NodeId KIF_NODE_hardware_cpu_cpuInfo;
-extern const KIF_NodeId KIF_NODE_hardware_interrupts_cookieList;
-extern const KIF_NodeId KIF_NODE_hardware_interrupts_cookieList_UsageStatus;
-extern const KIF_NodeId KIF_NODE_hardware_interrupts_cookieList_PCPU;
-extern const KIF_NodeId KIF_NODE_hardware_interrupts_cookieList_ZLKDevices;
-extern const KIF_NodeId KIF_NODE_hardware_acpi_tables;
-extern const KIF_NodeId KIF_NODE_hardware_acpi_tables_buffers;
-extern const KIF_NodeId KIF_NODE_system_morelfs_tardisks;
-extern const KIF_NodeId KIF_NODE_system_morelfs_tardisks_stats;
-extern const KIF_NodeId KIF_NODE_system_morelfs_ramdisks;
-extern const KIF_NodeId KIF_NODE_system_morelfs_ramdisks_stats;
-extern const KIF_NodeId KIF_NODE_system_morelfs_inodes;
-extern const KIF_NodeId KIF_NODE_system_morelfs_inodes_stats;
+// KIF_NODE_<path>, for every node that the tools read.
+#define NODE(path, ...) extern const KIF_NodeId KIF_NODE_##path;
+#define BEYOND(...)
+#include "nodes.def"
 
 #ifdef __cplusplus
 }

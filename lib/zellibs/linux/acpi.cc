@@ -135,6 +135,8 @@ KIF_Status GetAcpiBuffer(const NodeInfo &, const KIF_ParamList *instance, void *
   if (error != 0) return StatusOfErrno(error);
   if (given == 0) return KIF_STATUS_NOT_FOUND;
   buffer->length = static_cast<uint32_t>(given);
-  CopyText(buffer->signature, sizeof(buffer->signature), table->name, strlen(table->name));
+  char signature[sizeof(buffer->signature) + 1] = {};
+  CopyText(signature, sizeof(signature), table->name, strlen(table->name));
+  memcpy(buffer->signature, signature, sizeof(buffer->signature));
   return KIF_STATUS_OK;
 }

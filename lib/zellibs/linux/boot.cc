@@ -15,7 +15,7 @@
 
 namespace {
 
-constexpr size_t kCommandLineSize = sizeof(BootCommandLine::text);
+constexpr size_t kCommandLineSize = sizeof(BootCommandLine::commandLine);
 
 // The kernel's own limit is far lower on every architecture.
 using CommandLine = char[16384];

@@ -300,7 +300,7 @@ KIF_Status GetPciConfigSpace(const NodeInfo &node, const KIF_ParamList *instance
   if (status == KIF_STATUS_OK) status = OpenBelow(folder.fd(), "config", O_RDONLY, &file);
   if (status != KIF_STATUS_OK) return status;
   if (fstat(file.fd(), &facts) != 0) return StatusOfErrno(errno);
-  const uint32_t size = node.offers.recordSize;
+  const uint32_t size = node.recordSize;
   if (facts.st_size == kWithoutExtension && size > kWithoutExtension) return KIF_STATUS_NOT_FOUND;
   size_t given;
   const int error = ReadAt(file.fd(), record, size, 0, &given);

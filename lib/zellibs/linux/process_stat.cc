@@ -7,7 +7,7 @@
 
 namespace {
 
-// Long enough for the fields up to num_threads, with any name.
+// Long enough for the fields up to starttime, with any name.
 constexpr size_t kStatSize = 1024;
 
 constexpr unsigned long kKernelThreadFlag = 0x00200000;  // PF_KTHREAD, include/linux/sched.h
@@ -50,6 +50,10 @@ bool ParseStat(const char *text, size_t length, Stat *stat) {
   good = good && TakeUnsigned(&place, &userTicks) && TakeUnsigned(&place, &systemTicks);
   for (int field = 16; good && field <= 19; ++field) good = TakeUnsigned(&place, &skipped);
   if (!good || !TakeUnsigned(&place, &threads)) return false;
+  // A tree that somebody wrote need not have the rest.
+  if (!TakeUnsigned(&place, &skipped) || !TakeUnsigned(&place, &stat->startTicks)) {
+    stat->startTicks = kNoTicks;
+  }
   stat->isKernel = (flags & kKernelThreadFlag) != 0;
   stat->cpuTicks = userTicks + systemTicks;
   stat->threads = static_cast<uint32_t>(threads);

@@ -13,6 +13,7 @@ struct Stat {
   int32_t session;
   bool isKernel;  // a kernel thread
   uint64_t cpuTicks;
+  uint64_t startTicks;  // since the boot; kNoTicks where it is not told
   uint32_t threads;
   char name[kThreadNameSize];
 };

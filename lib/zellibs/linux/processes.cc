@@ -64,6 +64,7 @@ void FillProcess(const Stat &stat, Process *process) {
   process->group = stat.group;
   process->session = stat.session;
   process->threads = stat.threads;
+  process->startTicks = stat.startTicks;
   process->isKernel = stat.isKernel;
   process->isZombie = IsDead(stat.state);
 }

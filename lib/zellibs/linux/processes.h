@@ -10,16 +10,17 @@
 #include "zellibs.h"
 
 constexpr size_t kThreadNameSize = 64;  // proc(5): comm is cut to 15 bytes, kernel threads' to 63
-constexpr size_t kCommandLineSize = sizeof(CartelCommandLine::text);
+constexpr size_t kCommandLineSize = sizeof(CartelCommandLine::cmdline);
 
 struct Process {
   int32_t id;
-  int32_t parent;    // process ID
-  int32_t group;     // process group ID
-  int32_t session;   // session ID
-  uint32_t threads;  // as the kernel counts them
-  bool hasStat;      // the fields above and below are read
-  bool isKernel;     // a kernel thread
+  int32_t parent;       // process ID
+  int32_t group;        // process group ID
+  int32_t session;      // session ID
+  uint32_t threads;     // as the kernel counts them
+  uint64_t startTicks;  // since the boot; kNoTicks where it is not told
+  bool hasStat;         // the fields above and below are read
+  bool isKernel;        // a kernel thread
   bool isZombie;
   uint64_t pidNamespace;  // inode number; 0 where it may not be read
   uint32_t userspace;     // 0 none
@@ -37,11 +38,19 @@ struct Thread {
   char name[kThreadNameSize];
 };
 
+constexpr uint64_t kNoTicks = UINT64_MAX;
 constexpr uint32_t kNoThread = UINT32_MAX;
 constexpr uint32_t kNoCommandLine = UINT32_MAX;
 
 // What of a thread a reader asks for.
-enum class ThreadValue : uint8_t { kName = 1, kInfo = 2, kState = 4, kTimes = 8, kCpus = 16 };
+enum class ThreadValue : uint8_t {
+  kName = 1,
+  kInfo = 2,
+  kState = 4,
+  kTimes = 8,
+  kCpus = 16,
+  kStart = 32
+};
 
 // Takes a new picture of every thread, and gives the threads to list: processes ascending, each
 // one's main thread first, no zombies. The pointers live until the next picture.

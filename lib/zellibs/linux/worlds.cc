@@ -5,6 +5,7 @@
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/processes.h"
+#include "records/cartels.h"
 #include "records/worlds.h"
 #include "states.h"
 
@@ -28,6 +29,8 @@ constexpr State kStates[] = {
     {'Z', kZombie, kNone},
     {'X', kDead, kNone},
 };
+
+constexpr uint64_t kTicksPerSecond = 100;  // USER_HZ, the same on every architecture but one
 
 KIF_Status AppendInteger(int32_t id, void *list) {
   return KIF_ParamListAddInt(static_cast<KIF_ParamList *>(list), id);
@@ -112,7 +115,6 @@ KIF_Status GetStateTimes(const NodeInfo &, const KIF_ParamList *instance, void *
   const KIF_Status status =
       FindThread(Integer(instance, 0), ThreadValue::kTimes, &thread, &process);
   if (status != KIF_STATUS_OK) return status;
-  constexpr uint64_t kTicksPerSecond = 100;  // USER_HZ, the same on every architecture but one
   static_cast<SchedStateTimes *>(record)->usedTime = thread->cpuTicks * (1000000 / kTicksPerSecond);
   return KIF_STATUS_OK;
 }
@@ -124,6 +126,19 @@ KIF_Status ListCartels(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *l
 
 KIF_Status GetCommandLine(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   return ReadCommandLine(Integer(instance, 0), static_cast<char *>(record));
+}
+
+KIF_Status GetCartelStart(const NodeInfo &, const KIF_ParamList *instance, void *record) {
+  const Thread *thread;
+  const Process *process;
+  const KIF_Status status =
+      FindThread(Integer(instance, 0), ThreadValue::kStart, &thread, &process);
+  if (status != KIF_STATUS_OK) return status;
+  if (thread->id != process->id) return KIF_STATUS_NOT_FOUND;
+  if (process->startTicks == kNoTicks) return KIF_STATUS_OK;
+  *static_cast<CartelStart *>(record) = {kCartelStartKnown,
+                                         process->startTicks * (1000 / kTicksPerSecond)};
+  return KIF_STATUS_OK;
 }
 
 KIF_Status ListChildren(const NodeInfo &, const KIF_ParamList *parent, KIF_ParamList *list) {
