@@ -10,8 +10,8 @@
 
 #include "base/array.h"
 #include "base/everlasting.h"
-#include "linux/command_lines.h"
 #include "linux/files.h"
+#include "linux/process_command_lines.h"
 #include "linux/process_stat.h"
 #include "linux/userspaces.h"
 #include "status.h"

@@ -1,4 +1,4 @@
-#include "linux/command_lines.h"
+#include "linux/process_command_lines.h"
 
 #include <stdio.h>
 
