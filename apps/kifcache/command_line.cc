@@ -1,6 +1,7 @@
 #include "command_line.h"
 
 #include <getopt.h>
+#include <unistd.h>
 
 #include <cstring>
 #include <string_view>
@@ -104,7 +105,7 @@ std::string MistakeInOperands(const Command &command, const Arguments &given) {
     ++place;
   }
   if (place == given.operands.size()) return {};
-  return std::string("nothing is to be done with ") + given.operands[place];
+  return std::string(given.operands[place]) + " is one too many";
 }
 
 // The long options of a command, in the form of getopt_long.
@@ -188,6 +189,8 @@ int RunCommandLine(int argc, char **argv) {
     PrintUsage(stderr);
   } else if (name[0] == '-') {
     Complain(name, "a command comes first, and its options behind it: see kifcache --help");
+  } else if (access(argv[1], F_OK) == 0) {
+    Complain(name, "no command: kifcache check FILE tells what is in a file");
   } else {
     Complain(name, "no such command: see kifcache --help");
   }

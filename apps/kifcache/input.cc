@@ -72,9 +72,6 @@ std::string Advice(const char *path, KIF_Status status, const FileBytes &bytes) 
              std::to_string(flatbuffers::GetRoot<cache::Version>(bytes.map)->major_version()) +
              ".x reads it, this one is for " + std::to_string(kCacheMajorVersion) + ".x";
     case KIF_STATUS_NOT_A_CACHE_FILE:
-      if (IsStandardStream(path) && isatty(STDIN_FILENO) == 1) {
-        return "standard input is a terminal: give a file, or a recording through a pipe";
-      }
       return AdviceOnOther(path, View(bytes));
     default:
       return "";
@@ -92,6 +89,9 @@ bool Expand(const char *path, FileBytes *bytes) {
 }
 
 bool Open(const char *path, FileBytes *bytes, CacheFile *file) {
+  if (IsStandardStream(path) && isatty(STDIN_FILENO) == 1) {
+    return Complain(InputName(path), "a terminal: name a file, or send a recording through a pipe");
+  }
   KIF_Status status = OpenFileBytes(IsStandardStream(path) ? kStandardInput : path, bytes);
   if (status == KIF_STATUS_OK && IsGzip(*bytes) && !Expand(path, bytes)) return false;
   if (status == KIF_STATUS_OK) status = OpenCacheBytes(*bytes, file);
