@@ -128,7 +128,6 @@ KIF_Status ReadModules() {
   snapshot->read = false;
   snapshot->modules.Clear();
   snapshot->drivers.Clear();
-  snapshot->loaded = 0;
   KIF_Status status = AddLoadedModules();
   const bool hasModules = status == KIF_STATUS_OK;
   if (status == KIF_STATUS_OK || status == KIF_STATUS_NOT_FOUND) status = AddDrivers();
