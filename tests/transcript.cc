@@ -268,6 +268,7 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
   Surroundings surroundings = {
       .environment = {"ZELLIBS_HOST=" + host, "ZELLIBS_TRACE=" + Scratch() + "/trace",
                       "SOURCE=" + Link(SOURCE_DIR), "LSTAT_DEVICE=" + Preload(LSTAT_DEVICE),
+                      "OWN_SIGNALS=" + Preload(OWN_SIGNALS),
                       "ASAN_OPTIONS=detect_leaks=1:verify_asan_link_order=0"}};
   if (signals) surroundings.preloaded = {OWN_SIGNALS};
   const Outcome outcome = Run(run, surroundings);

@@ -118,7 +118,7 @@ constexpr int64_t kNanoseconds = 1000000000;
 class Clock {
  public:
   explicit Clock(bool isThisMachine)
-      : fixed_(getenv("SOURCE_DATE_EPOCH")), tellsBoot_(isThisMachine && fixed_ == nullptr) {}
+      : fixed_(secure_getenv("SOURCE_DATE_EPOCH")), tellsBoot_(isThisMachine && fixed_ == nullptr) {}
 
   bool isFixed() const { return fixed_ != nullptr; }
   Moments Begin(const char *name) const {

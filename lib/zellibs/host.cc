@@ -23,7 +23,7 @@ constexpr char kLinux[] = "linux";
 constexpr size_t kLinuxLength = sizeof(kLinux) - 1;
 
 const char *HostName() {
-  return getenv("ZELLIBS_HOST");
+  return secure_getenv("ZELLIBS_HOST");
 }
 
 Choice ChooseByEnvironment() {

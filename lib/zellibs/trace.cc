@@ -69,7 +69,7 @@ void ReportLive() {
 
 bool IsOn() {
   if (tracing == Tracing::kUnknown) {
-    const char *path = getenv("ZELLIBS_TRACE");
+    const char *path = secure_getenv("ZELLIBS_TRACE");
     tracing = Tracing::kOff;
     if (path != nullptr && path[0] != '\0') {
       descriptor = open(path, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600);

@@ -33,3 +33,8 @@ extern "C" __attribute__((visibility("default"))) int getopt_long(int, char *con
                                                                   int *) noexcept {
   PrintAndExit(letters, longOptions);
 }
+
+// No host of a test keeps a tool from its options.
+extern "C" __attribute__((visibility("default"))) bool KIF_HostIsForeign() {
+  return false;
+}

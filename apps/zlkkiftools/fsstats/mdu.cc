@@ -335,15 +335,18 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
   return status;
 }
 
+int RefuseCache() {
+  fputs("Using KIF cache is unsupported\n", stderr);
+  return 1;
+}
+
 }  // namespace
 
 int MduEntry(int argc, char **argv) {
-  if (InvokedWithCache != 0) {
-    fputs("Using KIF cache is unsupported\n", stderr);
-    return 1;
-  }
+  if (InvokedWithCache != 0) return RefuseCache();
   Options options;
   if (!ParseOptions(argc, argv, &options)) return Usage();
   if (options.unlinked) return UnlinkedFilesReport(options) != 0 ? 1 : 0;
+  if (HostIsElsewhere()) return RefuseCache();  // these files are not those of its inodes
   return ReportTree(options, optind < argc ? argv[optind] : ".");
 }

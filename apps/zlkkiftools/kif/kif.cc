@@ -4,6 +4,10 @@
 
 #include "kiftools.h"
 
+bool HostIsElsewhere() {
+  return InvokedWithCache != 0 || (KIF_HostIsForeign != nullptr && KIF_HostIsForeign());
+}
+
 KIF_Status GetInstanceList(KIF_NodeId node, KIF_ParamList *parent, ParamListHandle *list) {
   KIF_ParamList *fetched = nullptr;
   const KIF_Status status = KIF_GetInstanceListAlloc(node, parent, &fetched);

@@ -30,6 +30,13 @@ struct DataDeleter {
 };
 using DataHandle = std::unique_ptr<KIFData, DataDeleter>;
 
+// Libraries that know no other machine do not have it.
+#pragma weak KIF_HostIsForeign
+
+// Whether the processes and files of this machine are not the host's: on a cache run, and where the
+// library serves another machine live.
+bool HostIsElsewhere();
+
 // A new, empty list that selects an instance; null without memory.
 inline ParamListHandle CreateInstance() {
   return ParamListHandle(KIF_ParamListCreate(KIF_PARAMLIST_INSTANCE, 1));

@@ -34,7 +34,7 @@ int RefuseWithoutPattern() {
 }
 
 bool IsOwnCartel(int32_t cartelID) {
-  return InvokedWithCache == 0 && cartelID == getpid();
+  return cartelID == getpid() && !HostIsElsewhere();
 }
 
 KIF_Status PrintIfSelected(const MatchedCartel &cartel, void *context) {

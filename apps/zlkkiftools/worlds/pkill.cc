@@ -98,7 +98,7 @@ bool SignalCartels(const char *patternText, bool wholeLine, int signal) {
 }  // namespace
 
 int PkillEntry(int argc, char **argv) {
-  if (InvokedWithCache != 0) {
+  if (HostIsElsewhere()) {
     fputs("Using KIF cache is unsupported\n", stderr);
     return 1;
   }
