@@ -43,7 +43,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   JsonWriter json(nowhere);
   const bool isShown = Show(file, &text);
   if (isShown != Show(file, &json)) abort();
-  if (CheckFile(path, file, nowhere) && !isShown) abort();
+  if (CheckFile(path, file, true, nowhere) && !isShown) abort();
   CloseCacheFile(&file);
   if (KIF_UseCache(path, 0) != 0) abort();
   char date[21];

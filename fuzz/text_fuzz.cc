@@ -31,7 +31,7 @@ std::string Build(const HostModel &model) {
 std::string Dump() {
   CacheFile file;
   std::string problem;
-  if (OpenCacheFile(path.c_str(), &file) != 0 || !CheckFile(path.c_str(), file, nowhere)) abort();
+  if (OpenCacheFile(path.c_str(), &file) != 0 || !CheckFile(path.c_str(), file, true, nowhere)) abort();
   char *text = nullptr;
   size_t size = 0;
   FILE *stream = open_memstream(&text, &size);

@@ -6,6 +6,7 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <cinttypes>
 #include <cstring>
 #include <new>
 #include <string>
@@ -28,19 +29,34 @@ namespace {
 
 constexpr Option kRedact = {
     "redact", nullptr, "without the arguments of command lines and the values of boot options"};
+constexpr Option kVerbose = {"verbose", nullptr, "and how many answers there are of every node"};
 constexpr Option kJson = {"json", nullptr, "as JSON Lines"};
+
+// Another user may see more.
+void AdviseOnRights(const Facts &facts) {
+  uint64_t refused = 0;
+  for (const Lack &lack : facts.lacks) {
+    if (lack.reason == cache::Reason::Rights) refused += lack.count;
+  }
+  if (refused == 0 || geteuid() == 0) return;
+  fprintf(stderr, "kifcache: %" PRIu64 " answers were refused: run as root for a whole picture\n",
+          refused);
+}
 
 int Record(const Arguments &given) {
   const char *path = given.operands[0];
   HostModel model;
   if (!MayWriteRecording(path) || !RecordHost({given.Has(kRedact)}, &model)) return 1;
-  return WriteCacheFile(model, path) ? 0 : 1;
+  if (!WriteCacheFile(model, path)) return 1;
+  AdviseOnRights(model.facts);
+  return 0;
 }
 
 int Check(const Arguments &given) {
   const char *path = given.operands[0];
   const InputRecording input(path);
-  return input.isOpen() && CheckFile(InputName(path), input.file(), stdout) ? 0 : 1;
+  if (!input.isOpen()) return 1;
+  return CheckFile(InputName(path), input.file(), given.Has(kVerbose), stdout) ? 0 : 1;
 }
 
 int Dump(const Arguments &given) {
@@ -100,7 +116,7 @@ void EndWhenOutOfMemory() {
 
 const Command kCommands[] = {
     {"record", "FILE", "save this host into FILE", Record, {&kRedact}},
-    {"check", "FILE", "verify FILE and tell what is in it", Check, {}},
+    {"check", "FILE", "verify FILE and tell what is in it", Check, {&kVerbose}},
     {"dump", "FILE", "print what FILE holds as text", Dump, {&kJson}},
     {"build", "TEXT FILE", "make FILE from the text that dump prints", Build, {}},
     {"nodes", "", "list the nodes and the named fields of their records", Nodes, {}},
