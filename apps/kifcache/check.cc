@@ -38,8 +38,6 @@ class Counter : public Visitor {
   }
   void OnSet(const VisitedNode &node, KIF_Status) override { ++counts_[node.path].failing; }
 
-  void EndProgress() { progress_.Clear(); }
-
   const Facts &facts() const { return facts_; }
   const std::map<std::string, Counts> &counts() const { return counts_; }
   const Refusals &refusals() const { return refusals_; }
@@ -171,7 +169,7 @@ bool CheckFile(const char *path, const CacheFile &file, bool isVerbose, FILE *st
   Counter counter;
   std::string problem;
   const bool isWhole = VisitAll(file, &counter, &problem);
-  counter.EndProgress();
+  ClearProgress();
   if (!isWhole) {
     fprintf(stderr, "kifcache: %s: damaged: what it has of %s\n", path, Shown(problem).c_str());
     return false;

@@ -3,6 +3,7 @@
 #include <stdio.h>
 
 #include "base/utf8.h"
+#include "progress.h"
 
 std::string Masked(std::string_view word) {
   std::string masked(word);
@@ -11,6 +12,7 @@ std::string Masked(std::string_view word) {
 }
 
 bool Complain(std::string_view about, std::string_view message) {
+  ClearProgress();
   const std::string line = Masked(std::string(about) + ": " + std::string(message));
   fprintf(stderr, "kifcache: %s\n", line.c_str());
   return false;

@@ -11,6 +11,8 @@ namespace {
 constexpr int64_t kBeforeFirst = 500;  // milliseconds
 constexpr int64_t kBetween = 100;
 
+bool isShown = false;  // there is one standard error
+
 int64_t Now() {
   struct timespec now = {};
   clock_gettime(CLOCK_MONOTONIC_COARSE, &now);
@@ -26,11 +28,11 @@ void Progress::ShowInTime(const char *where) {
   const int64_t now = Now();
   if (now < next_) return;
   next_ = now + kBetween;
-  isShown_ = true;
+  isShown = true;
   fprintf(stderr, "\rkifcache: %" PRIu64 " %s, %.45s\033[K", count_, unit_, where);
 }
 
-void Progress::Clear() {
-  if (isShown_) fputs("\r\033[K", stderr);
-  isShown_ = false;
+void ClearProgress() {
+  if (isShown) fputs("\r\033[K", stderr);
+  isShown = false;
 }

@@ -3,11 +3,14 @@
 
 #include <cstdint>
 
+// Takes the line away, before a message.
+void ClearProgress();
+
 class Progress {
  public:
   // `unit` is what is counted, such as "answers".
   explicit Progress(const char *unit);
-  ~Progress() { Clear(); }
+  ~Progress() { ClearProgress(); }
   Progress(const Progress &) = delete;
   Progress &operator=(const Progress &) = delete;
 
@@ -17,9 +20,6 @@ class Progress {
     if (isTerminal_) ShowInTime(where);
   }
 
-  // Takes the line away.
-  void Clear();
-
  private:
   void ShowInTime(const char *where);
 
@@ -27,5 +27,4 @@ class Progress {
   uint64_t count_ = 0;
   int64_t next_;  // when the line is due, in milliseconds since the boot
   bool isTerminal_;
-  bool isShown_ = false;
 };

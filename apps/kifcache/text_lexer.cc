@@ -7,6 +7,7 @@
 #include <cstring>
 
 #include "base/hex.h"
+#include "progress.h"
 
 bool ParseNumber(std::string_view word, Number *number) {
   number->negative = word.starts_with('-');
@@ -44,6 +45,7 @@ bool ParseHex(std::string_view digits, std::string *bytes) {
 }
 
 bool TextLexer::Fail(const char *format, ...) {
+  ClearProgress();
   fprintf(stderr, "%s:%u: ", name_, lineNumber_);
   va_list arguments;
   va_start(arguments, format);

@@ -5,6 +5,7 @@
 #include <iterator>
 
 #include "description_text.h"
+#include "progress.h"
 #include "text_lexer.h"
 
 namespace {
@@ -83,7 +84,9 @@ bool Reader::Read() {
     if (TakeWord("node") && !ReadNodeLine()) return false;
   }
   Rewind();
+  Progress progress("lines");
   while (NextLine()) {
+    progress.Step("read");
     if (TakeWord("node")) continue;
     if (!ReadLine() || !ReadEndOfLine()) return false;
   }
