@@ -8,6 +8,7 @@
 #include <unordered_set>
 
 #include "cache_file.h"
+#include "messages.h"
 #include "output.h"
 
 namespace {
@@ -194,8 +195,7 @@ flatbuffers::DetachedBuffer ContentBuilder::Build() {
 
 bool WriteCacheFile(const HostModel &model, const char *path) {
   if (model.size() > kMostModelSize) {
-    fprintf(stderr, "kifcache: %s: the host is too large for a cache file\n", path);
-    return false;
+    return Complain(path, "the host is too large for a cache file");
   }
   const flatbuffers::DetachedBuffer content = ContentBuilder(model).Build();
   flatbuffers::FlatBufferBuilder builder(content.size() + 64);

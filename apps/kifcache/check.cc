@@ -8,6 +8,7 @@
 #include <string>
 
 #include "encoding.h"
+#include "messages.h"
 #include "progress.h"
 #include "refusals.h"
 #include "visit.h"
@@ -163,16 +164,14 @@ void PrintCounts(const std::map<std::string, Counts> &counts, FILE *stream) {
 bool CheckFile(const char *path, const CacheFile &file, bool isVerbose, FILE *stream) {
   const auto *content = file.header->content();
   if (crc32_z(0, content->data(), content->size()) != file.header->checksum()) {
-    fprintf(stderr, "kifcache: %s: damaged: its bytes do not have the checksum in it\n", path);
-    return false;
+    return Complain(path, "damaged: its bytes do not have the checksum in it");
   }
   Counter counter;
   std::string problem;
   const bool isWhole = VisitAll(file, &counter, &problem);
   ClearProgress();
   if (!isWhole) {
-    fprintf(stderr, "kifcache: %s: damaged: what it has of %s\n", path, Shown(problem).c_str());
-    return false;
+    return Complain(path, "damaged: what it has of " + problem);
   }
   PrintFacts(file, counter.facts(), stream);
   PrintLacks(counter.facts(), counter.refusals(), stream);

@@ -30,10 +30,14 @@ std::string Quoted(std::string_view text) {
 
 std::string JsonString(std::string_view text) {
   std::string quoted = "\"";
-  for (const char c : text) {
+  for (size_t i = 0; i < text.size(); ++i) {
+    const char c = text[i];
+    const auto isControl = [](char byte) { return static_cast<unsigned char>(byte) < 0xa0; };
     if (c == '"' || c == '\\') {
       quoted += '\\';
       quoted += c;
+    } else if (c == '\xc2' && i + 1 < text.size() && isControl(text[i + 1])) {
+      quoted += "\\u00" + HexDigits({&text[++i], 1});
     } else if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f) {
       quoted += "\\u00" + HexDigits({&c, 1});
     } else {

@@ -4,7 +4,9 @@
 #include <fcntl.h>
 #include <signal.h>
 #include <stdio.h>
+#include <stdint.h>
 #include <stdlib.h>
+#include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -12,23 +14,22 @@
 #include <string>
 
 #include "base/io.h"
+#include "messages.h"
 
 namespace {
 
 bool Fail(const char *path, int error) {
-  fprintf(stderr, "kifcache: %s: %s\n", path, strerror(error));
-  return false;
+  return Complain(path, strerror(error));
 }
 
-// Keeps the signals that end a program back for as long as it lives, so that no half-written file
-// stays behind.
+// Keeps every signal that can be kept back until later, for as long as it lives: while a name of
+// ours stands beside the file, none leaves it behind.
 class SignalsHeld {
  public:
   SignalsHeld() {
-    sigset_t held;
-    sigemptyset(&held);
-    for (const int signal : {SIGHUP, SIGINT, SIGQUIT, SIGTERM}) sigaddset(&held, signal);
-    sigprocmask(SIG_BLOCK, &held, &before_);
+    sigset_t all;
+    sigfillset(&all);
+    sigprocmask(SIG_BLOCK, &all, &before_);
   }
   ~SignalsHeld() { sigprocmask(SIG_SETMASK, &before_, nullptr); }
   SignalsHeld(const SignalsHeld &) = delete;
@@ -38,14 +39,73 @@ class SignalsHeld {
   sigset_t before_;
 };
 
+std::string DirectoryOf(const std::string &path) {
+  const size_t slash = path.rfind('/');
+  return slash == path.npos ? "." : path.substr(0, slash + 1);
+}
+
 // A rename is on disk when its directory is; a directory that cannot be flushed is left at that.
 void FlushDirectory(const std::string &path) {
-  const size_t slash = path.rfind('/');
-  const std::string directory = slash == path.npos ? "." : path.substr(0, slash + 1);
-  const int descriptor = open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  const int descriptor = open(DirectoryOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (descriptor == -1) return;
   (void)fsync(descriptor);
   close(descriptor);
+}
+
+int WriteAndFlush(int descriptor, const void *bytes, size_t size) {
+  const int error = WriteAll(descriptor, bytes, size);
+  return error == 0 && fsync(descriptor) != 0 ? errno : error;
+}
+
+int RenameOrRemove(const std::string &temporary, const char *path) {
+  if (rename(temporary.c_str(), path) == 0) return 0;
+  const int error = errno;
+  unlink(temporary.c_str());
+  return error;
+}
+
+// Gives the file without a name one beside `path`, and then that.
+int NameFile(int descriptor, const char *path) {
+  const std::string file = "/proc/self/fd/" + std::to_string(descriptor);
+  constexpr int kMostAttempts = 100;
+  const SignalsHeld held;
+  for (int attempt = 0; attempt < kMostAttempts; ++attempt) {
+    uint32_t number = 0;
+    if (getrandom(&number, sizeof(number), 0) != sizeof(number)) return errno;
+    char suffix[16];
+    snprintf(suffix, sizeof(suffix), ".%08x", number);
+    const std::string temporary = path + std::string(suffix);
+    if (linkat(AT_FDCWD, file.c_str(), AT_FDCWD, temporary.c_str(), AT_SYMLINK_FOLLOW) == 0) {
+      return RenameOrRemove(temporary, path);
+    }
+    if (errno != EEXIST) return errno;
+  }
+  return EEXIST;
+}
+
+// A file that has a name from its beginning.
+int WriteNamed(const char *path, const void *bytes, size_t size) {
+  std::string temporary = path + std::string(".XXXXXX");
+  const SignalsHeld held;
+  const int descriptor = mkostemp(temporary.data(), O_CLOEXEC);  // mode 0600
+  if (descriptor == -1) return errno;
+  int error = WriteAndFlush(descriptor, bytes, size);
+  if (close(descriptor) != 0 && error == 0) error = errno;
+  if (error == 0) return RenameOrRemove(temporary, path);
+  unlink(temporary.c_str());
+  return error;
+}
+
+// A file that has no name until it is whole: whatever ends the program leaves nothing behind. Not
+// every file system can, nor can it be named without /proc.
+int WriteNameless(const char *path, const void *bytes, size_t size, bool *possible) {
+  const int descriptor = open(DirectoryOf(path).c_str(), O_TMPFILE | O_WRONLY | O_CLOEXEC, 0600);
+  *possible = descriptor != -1 && access("/proc/self/fd", X_OK) == 0;
+  int error = 0;
+  if (*possible) error = WriteAndFlush(descriptor, bytes, size);
+  if (*possible && error == 0) error = NameFile(descriptor, path);
+  if (descriptor != -1) close(descriptor);
+  return error;
 }
 
 }  // namespace
@@ -53,21 +113,12 @@ void FlushDirectory(const std::string &path) {
 bool ReplaceFile(const char *path, const void *bytes, size_t size) {
   struct stat status;
   if (lstat(path, &status) == 0 && !S_ISREG(status.st_mode)) {
-    fprintf(stderr, "kifcache: %s: not a regular file\n", path);
-    return false;
+    return Complain(path, "not a regular file");
   }
-  std::string temporary = std::string(path) + ".XXXXXX";
-  const SignalsHeld held;
-  const int descriptor = mkostemp(temporary.data(), O_CLOEXEC);  // mode 0600
-  if (descriptor == -1) return Fail(path, errno);
-  int error = WriteAll(descriptor, bytes, size);
-  if (error == 0 && fsync(descriptor) != 0) error = errno;
-  if (close(descriptor) != 0 && error == 0) error = errno;
-  if (error == 0 && rename(temporary.c_str(), path) != 0) error = errno;
-  if (error != 0) {
-    unlink(temporary.c_str());
-    return Fail(path, error);
-  }
+  bool nameless = false;
+  int error = WriteNameless(path, bytes, size, &nameless);
+  if (!nameless) error = WriteNamed(path, bytes, size);
+  if (error != 0) return Fail(path, error);
   FlushDirectory(path);
   return true;
 }

@@ -7,6 +7,7 @@
 #include <cstring>
 
 #include "base/hex.h"
+#include "messages.h"
 #include "progress.h"
 
 bool ParseNumber(std::string_view word, Number *number) {
@@ -46,12 +47,12 @@ bool ParseHex(std::string_view digits, std::string *bytes) {
 
 bool TextLexer::Fail(const char *format, ...) {
   ClearProgress();
-  fprintf(stderr, "%s:%u: ", name_, lineNumber_);
+  char message[1024];
   va_list arguments;
   va_start(arguments, format);
-  vfprintf(stderr, format, arguments);
+  vsnprintf(message, sizeof(message), format, arguments);
   va_end(arguments);
-  fputc('\n', stderr);
+  fprintf(stderr, "%s:%u: %s\n", Masked(name_).c_str(), lineNumber_, Masked(message).c_str());
   return false;
 }
 

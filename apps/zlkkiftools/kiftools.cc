@@ -98,7 +98,7 @@ int RunTool(int argc, char **argv) {
           "usage: %s [options] [function] [arguments]\n       or [function] [arguments]\n\n"
           "Options:\n   --cache, -c    Perform the operation on a given KIF cache file\n\n"
           "Functions:\n",
-          argv[0] != nullptr ? argv[0] : "");
+          Printable(argv[0] != nullptr ? argv[0] : "").text());
   PrintToolNames();
   return 1;
 }
@@ -137,7 +137,7 @@ __attribute__((visibility("default"))) int main(int argc, char **argv) {
   if (programForm && argc >= 4 && IsCacheOption(argv[1])) {
     const KIF_Status status = KIF_UseCache(argv[2], 0);
     if (status != 0) {
-      fprintf(stderr, "Couldn't use specifed cache file %s: %s\n", argv[2],
+      fprintf(stderr, "Couldn't use specifed cache file %s: %s\n", Printable(argv[2]).text(),
               ZLK_ReturnStatusToString(status));
       return 1;
     }

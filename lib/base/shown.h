@@ -16,6 +16,24 @@ inline bool IsTerminal(FILE *stream) {
   return answer != 0;
 }
 
+// A text that somebody chose freely, a file's name or a word of a command line, as it may stand in a
+// message anywhere: its control characters are '?', lest it forge a line of a log. Lives as long as
+// the call it is passed to.
+class Printable {
+ public:
+  explicit Printable(const char *text) : text_(text != nullptr ? strdup(text) : nullptr) {
+    if (text_ != nullptr) MaskControls(text_, strlen(text_));
+  }
+  ~Printable() { free(text_); }
+  Printable(const Printable &) = delete;
+  Printable &operator=(const Printable &) = delete;
+
+  const char *text() const { return text_ != nullptr ? text_ : "?"; }
+
+ private:
+  char *text_;
+};
+
 // A text as it may be shown on `stream`: on a terminal its control characters are '?', elsewhere it
 // is the text itself. Lives as long as the call it is passed to:
 //   printf("%-20s\n", Shown(name).text());

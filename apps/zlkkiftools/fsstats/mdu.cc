@@ -148,12 +148,12 @@ __attribute__((noinline)) Measured Measure(const Walk &walk, const char *path,
   const ParamListHandle inode = SelectInode(file.st_ino, &status);
   if (status == 0) status = ReadRecord(KIF_NODE_system_morelfs_inodes_stats, inode.get(), &stats);
   if (status != 0) {
-    fprintf(stderr, "KIF_Get error for '%s' (%s)\n", Shown(path, stderr).text(),
+    fprintf(stderr, "KIF_Get error for '%s' (%s)\n", Printable(path).text(),
             ZLK_ReturnStatusToString(status));
     return Measured::kNothing;
   }
   if (walk.capacity == 0) {
-    fprintf(stderr, "No bucket space for '%s'\n", Shown(path, stderr).text());
+    fprintf(stderr, "No bucket space for '%s'\n", Printable(path).text());
     return Measured::kNothing;
   }
   FillBucket(stats, bucket);
@@ -204,8 +204,8 @@ size_t DustatsWalk(Walk *walk, const char *path, uint32_t depth, DustatsBucket *
 
 void PrintTooLong(Walk *walk, const Level &level, const char *name, size_t length) {
   walk->path[level.pathLength] = '\0';
-  fprintf(stderr, "path too long for '%s' '%s' (%zu)\n", Shown(walk->path, stderr).text(),
-          Shown(name, stderr).text(), length);
+  fprintf(stderr, "path too long for '%s' '%s' (%zu)\n", Printable(walk->path).text(),
+          Printable(name).text(), length);
   walk->path[level.prefix - 1] = '/';
 }
 
@@ -235,7 +235,7 @@ size_t WalkDirectory(Walk *walk, const char *path, uint32_t depth, DustatsBucket
   const bool hasSlash = length > 0 && path[length - 1] == '/';
   Level level = {length, hasSlash ? length : length + 1, depth, buckets, 1};
   if (level.prefix > kLongestPath) {
-    fprintf(stderr, "path too long for '%s' (%zu)\n", Shown(path, stderr).text(),
+    fprintf(stderr, "path too long for '%s' (%zu)\n", Printable(path).text(),
             length > kLongestPath ? length : level.prefix);
     return 0;
   }

@@ -6,11 +6,11 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
-#include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "base/bytes.h"
+#include "base/io.h"
+#include "base/shown.h"
 
 namespace {
 
@@ -24,18 +24,6 @@ constexpr size_t kLongestLine = 255;
 
 [[noreturn]] void OutOfMemory() {
   EndWith("Not enough memory for file list\n");
-}
-
-// Maps a regular file, which costs an eighth of reading it: fresh memory is what is expensive.
-// Null for every other kind of file, and where it cannot be mapped.
-char *MapFile(int descriptor, size_t *size) {
-  struct stat status;
-  if (fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode) || status.st_size <= 0) {
-    return nullptr;
-  }
-  *size = static_cast<size_t>(status.st_size);
-  void *bytes = mmap(nullptr, *size, PROT_READ, MAP_PRIVATE, descriptor, 0);
-  return bytes != MAP_FAILED ? static_cast<char *>(bytes) : nullptr;
 }
 
 bool IsIdsFileName(std::string_view name) {
@@ -79,22 +67,27 @@ void PciIdsFileList::AddDirectory(const char *directory) {
   closedir(listing);
 }
 
-// A failed read ends the file.
+// A mapping would cost less, but the names and lengths taken from it would not survive a package
+// manager or an editor that writes the file. A failed read ends the file.
 void PciIdsFileList::Read(int descriptor, File *file) {
-  Bytes bytes;
-  if (bytes.ReadAll(descriptor, SIZE_MAX) == ENOMEM) OutOfMemory();
-  file->size = bytes.size();
-  file->bytes = bytes.Release();
+  struct stat status;
+  if (fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode) || status.st_size <= 0) return;
+  const auto size = static_cast<uint64_t>(status.st_size);
+  if (size < SIZE_MAX) file->bytes = static_cast<char *>(malloc(static_cast<size_t>(size)));
+  if (file->bytes == nullptr) {
+    fprintf(stderr, "Not enough memory for file %s\n", Printable(file->path).text());
+    return;
+  }
+  ReadAt(descriptor, file->bytes, static_cast<size_t>(size), 0, &file->size);
+  file->hasNul = memchr(file->bytes, '\0', file->size) != nullptr;
 }
 
+// Whoever may write into the folder could have a pipe there.
 void PciIdsFileList::Load(File *file) {
   file->read = true;
-  const int descriptor = open(file->path, O_RDONLY | O_CLOEXEC);
+  const int descriptor = open(file->path, O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY);
   if (descriptor < 0) return;
-  file->bytes = MapFile(descriptor, &file->size);
-  file->mapped = file->bytes != nullptr;
-  if (!file->mapped) Read(descriptor, file);
-  file->hasNul = memchr(file->bytes, '\0', file->size) != nullptr;
+  Read(descriptor, file);
   close(descriptor);
 }
 
@@ -129,10 +122,6 @@ void PciIdsFileList::Rewind() {
 PciIdsFileList::~PciIdsFileList() {
   for (const File &file : files_) {
     free(file.path);
-    if (file.mapped) {
-      munmap(file.bytes, file.size);
-    } else {
-      free(file.bytes);
-    }
+    free(file.bytes);
   }
 }

@@ -7,7 +7,8 @@
 #include "base/array.h"
 
 // An ordered list of files and a cursor over their lines. A file is read once, when the cursor
-// first comes to it; a file that cannot be opened has no lines. Lines, paths and the bytes behind
+// first comes to it; one that cannot be opened or is no regular file has no lines, nor has one that
+// does not fit into memory, which a message tells. Lines, paths and the bytes behind
 // them live as long as the list. Being out of memory, and a path that is too long, end the process
 // with a message and status 1.
 class PciIdsFileList {
@@ -46,7 +47,6 @@ class PciIdsFileList {
     char *bytes = nullptr;  // null: not read yet, or nothing in it
     size_t size = 0;
     bool read = false;
-    bool mapped = false;  // bytes is a mapping, not an allocation
     bool hasNul = false;
   };
 

@@ -61,7 +61,7 @@ void CopyName(char (&field)[Room], std::string_view name) {
 
 void ReportMalformed(int message) {
   fprintf(stderr, "%s: line %d improperly formatted(%d)\n",
-          Shown(idsFiles->CurrentPath(), stderr).text(), idsFiles->LineNumber(), message);
+          Printable(idsFiles->CurrentPath()).text(), idsFiles->LineNumber(), message);
 }
 
 // ndevid, and the rows that VendorTable needs, from the lines of the device section.
@@ -160,7 +160,7 @@ bool AddDevice(DevicePass *pass, std::string_view line) {
   std::string_view name;  // stays without a text when there is none in the line
   if (!ParseIdAndName(TextFrom(line, 1), kDeviceNameRoom, &number, &name) && !pass->HasVendor()) {
     fprintf(stderr, "%s: can't synthesize device name for line %d\n",
-            Shown(idsFiles->CurrentPath(), stderr).text(), idsFiles->LineNumber());
+            Printable(idsFiles->CurrentPath()).text(), idsFiles->LineNumber());
     return false;
   }
   pass->deviceID = static_cast<uint16_t>(number);

@@ -192,7 +192,7 @@ bool PrintContent(const Request &request, const char *name) {
   if (file == nullptr || KIF_ParamListAddString(file.get(), name) != 0) return false;
   uint32_t total = 0;
   if (KIF_GetDataLength(KIF_NODE_system_bootOptionFiles_content, file.get(), &total) != 0) {
-    printf("Invalid boot option file name %s\n", Shown(name).text());
+    printf("Invalid boot option file name %s\n", Printable(name).text());
     return false;
   }
   if (!request.raw) printf("Boot Option File Content %s : ", Shown(name).text());

@@ -2,6 +2,7 @@
 #include <getopt.h>
 #include <stdio.h>
 
+#include "base/shown.h"
 #include "kif/kif.h"
 #include "records/platform.h"
 #include "tools.h"
@@ -57,14 +58,14 @@ bool ParseOptions(int argc, char **argv, const char **time, const char **date) {
 bool ParseTime(const char *text, ClockTime *wanted) {
   if (text == nullptr) return true;
   if (sscanf(text, "%d:%d:%d", &wanted->hour, &wanted->minute, &wanted->second) == 3) return true;
-  printf("Invalid time format: %s\n", text);
+  printf("Invalid time format: %s\n", Printable(text).text());
   return false;
 }
 
 bool ParseDate(const char *text, ClockTime *wanted) {
   if (text == nullptr) return true;
   if (sscanf(text, "%d/%d/%d", &wanted->month, &wanted->day, &wanted->year) == 3) return true;
-  printf("Invalid date format: %s\n", text);
+  printf("Invalid date format: %s\n", Printable(text).text());
   return false;
 }
 
