@@ -93,41 +93,6 @@ std::string HostTest::Record(const std::string &hostText) {
   return file;
 }
 
-Outcome HostTest::Live(const std::string &hostText, const std::vector<std::string> &arguments,
-                       Surroundings surroundings) {
-  std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools"};
-  commandLine.insert(commandLine.end(), arguments.begin(), arguments.end());
-  return RunTool(commandLine, std::move(surroundings), Record(hostText));
-}
-
-Outcome HostTest::Cache(const std::string &hostText, const std::vector<std::string> &arguments,
-                        Surroundings surroundings) {
-  std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools", "-c", Record(hostText)};
-  commandLine.insert(commandLine.end(), arguments.begin(), arguments.end());
-  return RunTool(commandLine, std::move(surroundings), "none");
-}
-
-Outcome HostTest::Linux(const std::string &root, const std::vector<std::string> &arguments,
-                        Surroundings surroundings) {
-  std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools"};
-  commandLine.insert(commandLine.end(), arguments.begin(), arguments.end());
-  return RunTool(commandLine, std::move(surroundings), root == "/" ? "linux" : "linux:" + root);
-}
-
-Outcome HostTest::RunTool(const std::vector<std::string> &commandLine, Surroundings surroundings,
-                          const std::string &host) {
-  const std::string traceFile = scratch_ + "/trace";
-  unlink(traceFile.c_str());
-  surroundings.environment.push_back("ZELLIBS_HOST=" + host);
-  surroundings.environment.push_back("ZELLIBS_TRACE=" + traceFile);
-  const Outcome outcome = Run(commandLine, surroundings);
-  trace_ = ReadFile(traceFile);
-  if (!mayLeak_) {
-    EXPECT_EQ(trace_.find("never destroyed"), std::string::npos) << trace_;
-  }
-  return outcome;
-}
-
 Outcome HostTest::Run(const std::vector<std::string> &commandLine, Surroundings surroundings) {
   const std::string directory = surroundings.directory.empty() ? scratch_ : surroundings.directory;
   std::string preloaded;
@@ -205,11 +170,4 @@ std::string HostTest::ReadFile(const std::string &path) {
   std::ostringstream bytes;
   bytes << std::ifstream(path, std::ios::binary).rdbuf();
   return bytes.str();
-}
-
-bool IsInstalled(const std::string &program) {
-  for (const char *directory : {"/usr/sbin/", "/usr/bin/", "/sbin/", "/bin/"}) {
-    if (access((directory + program).c_str(), X_OK) == 0) return true;
-  }
-  return false;
 }

@@ -30,18 +30,6 @@ class HostTest : public testing::Test {
   // where kifcache refuses the text.
   std::string Record(const std::string &hostText);
 
-  // Runs `arguments` (the tool's name first) as the program form on the host, live.
-  Outcome Live(const std::string &hostText, const std::vector<std::string> &arguments,
-               Surroundings surroundings = {});
-
-  // The same as a cache run: zlkkiftools -c FILE arguments...
-  Outcome Cache(const std::string &hostText, const std::vector<std::string> &arguments,
-                Surroundings surroundings = {});
-
-  // Runs a tool on the Linux machine whose tree of files is at `root` ("/": this machine).
-  Outcome Linux(const std::string &root, const std::vector<std::string> &arguments,
-                Surroundings surroundings = {});
-
   // Runs any program: its path or name first. A shell finds the folders of the build in the
   // variables BIN_DIR and LIB_DIR.
   Outcome Run(const std::vector<std::string> &commandLine, Surroundings surroundings = {});
@@ -65,21 +53,7 @@ class HostTest : public testing::Test {
   static std::string ReadFile(const std::string &path);
   const std::string &Scratch() const { return scratch_; }
 
-  // The lines of what the platform library wrote to its trace in the last Live, Cache or Linux
-  // run; every such run also checks that the program left no list or data object behind, unless
-  // MayLeak() was called.
-  const std::string &Trace() const { return trace_; }
-  void MayLeak() { mayLeak_ = true; }
-
  private:
-  Outcome RunTool(const std::vector<std::string> &commandLine, Surroundings surroundings,
-                  const std::string &host);
-
   std::string scratch_;
-  std::string trace_;
   int recorded_ = 0;
-  bool mayLeak_ = false;
 };
-
-// Whether a program of this name is installed on the machine.
-bool IsInstalled(const std::string &program);

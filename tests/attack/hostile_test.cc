@@ -1,79 +1,79 @@
 // Recordings that were made to do harm: every tool shows them without an escape on a terminal,
 // writes nowhere else, and ends.
-#include <fcntl.h>
 #include <pty.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
 #include <regex>
-#include <sstream>
 
 #include "attack/attack.h"
-#include "host_fixture.h"
 
 namespace {
 
 const char kEscape[] = "\\x1b]0;owned\\x07\\x1b[31m\\x9b5m\\r\\n\\x7f";
 
-// A text field of `size` bytes that fills it whole.
-std::string Filling(size_t size) {
-  std::string text;
-  while (text.size() < size) text += '~';
-  return "\"" + text + "\"";
-}
+// Every text field that a tool shows, its size after "~": filled whole.
+const char kFilledFields[] = R"(list world = 1
+list userworld_cartel = 1
+record world_name 1 = name=~128
+record world_info 1 = worldID=1 cartelID=1 worldType=4
+record sched_Vcpus_stats_affinity 1 = cpuText=~2304
+record userworld_cartel_cmdline 1 = cmdline=~1024
+list userworld_cartel_fd_fds 1 = 1
+record userworld_cartel_fd_fds 1 1 = kind=~96 description=~1984
+list userworld_cartel_mem_mmaps 1 = 1
+record userworld_cartel_mem_mmaps 1 1 = kind=2 description=~2008
+record system_version = product=~32 version=~64 releaseLevel=~64 update=~132
+record system_bootCmdLine = commandLine=~4096
+record system_bootMAC = address=~24
+list system_modules = 1
+record system_modules_general 1 = moduleID=1 name=~288
+list hardware_pci_seg = 0
+list hardware_pci_seg_bus 0 = 0
+list hardware_pci_seg_bus_slot 0 0 = 31
+list hardware_pci_seg_bus_slot_func 0 0 31 = 2
+record hardware_pci_seg_bus_slot_func_pciConfigHeader 0 0 31 2 = mFlags=2 moduleID=1 name=~33
+list system_morelfs_inodes = 1
+record system_morelfs_inodes_stats 1 = linkState=-4 tardisk=~128 ramdisk=~128 name=~256
+list hardware_acpi_tables = 1
+list hardware_acpi_tables_buffers 1 = 0
+record hardware_acpi_tables_buffers 1 0 = signature="/../" @4:u8=255 length=1
+)";
 
-// The whole host, its lines changed where they match.
-std::string Changed(const std::string &lines, const std::string &change,
-                    const std::string &host = kWholeHost) {
+// A host's text, its lines changed where they match.
+std::string Changed(const std::string &lines, const std::string &change, const std::string &host) {
   std::string changed;
   std::istringstream stream(host);
+  const size_t bar = change.find('|');
+  const std::regex meant(lines), from(change.substr(0, bar));
   for (std::string line; std::getline(stream, line);) {
-    const bool isMeant = std::regex_search(line, std::regex(lines));
-    const size_t bar = change.find('|');
-    changed += isMeant ? std::regex_replace(line, std::regex(change.substr(0, bar)),
-                                            change.substr(bar + 1))
-                       : line;
+    const bool isMeant = std::regex_search(line, meant);
+    changed += isMeant ? std::regex_replace(line, from, change.substr(bar + 1)) : line;
     changed += '\n';
   }
   return changed;
 }
 
-// With `text` at the beginning of every text that a tool shows; three fields are short.
-std::string WithTexts(const std::string &text) {
-  const std::string host = Changed("^(?!.*(signature|bootMAC|hba0))",
-                                   "\"(?=[^\"]*\"(?:[^\"]*\"[^\"]*\")*[^\"]*$)|\"" + text);
-  return Changed("signature", "DSDT|\\x1b[1m", Changed("hba0", "hba0|\\x1b]0;\\x07", host));
-}
-
-class Hostile : public HostTest {
+class Hostile : public AttackTest {
  protected:
-  Hostile() {
-    std::filesystem::create_directory(Scratch() + "/folder");
-    WriteFile("folder/file", "");
-  }
-
-  std::vector<std::string> CommandLine(const Command &command) const {
-    std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools"};
-    commandLine.insert(commandLine.end(), command.arguments.begin(), command.arguments.end());
-    return commandLine;
+  // The whole host with `text` at the beginning of every text that a tool shows; three fields are
+  // short.
+  std::string WithTexts(const std::string &text) const {
+    const std::string host =
+        Changed("^(?!.*(signature|bootMAC|hba0))",
+                "\"(?=[^\"]*\"(?:[^\"]*\"[^\"]*\")*[^\"]*$)|\"" + text, whole_);
+    return Changed("signature", "DSDT|\\x1b[1m", Changed("hba0", "hba0|\\x1b]0;\\x07", host));
   }
 
   // Runs every tool on the host; what it does to the machine is looked at here.
   void RunAll(const std::string &hostText) {
     const std::string host = Record(hostText);
     for (const Command &command : kCommands) {
-      const Outcome outcome =
-          Run(CommandLine(command),
-              {.environment = {"ZELLIBS_HOST=" + host, "ASAN_OPTIONS=allocator_may_return_null=1"},
-               .directory = Scratch() + "/folder"});
-      const std::string what = Describe(command.arguments) + "\n" + outcome.err;
-      EXPECT_GE(outcome.status, 0) << what;
-      EXPECT_EQ(outcome.err.find("ERROR: "), outcome.err.npos) << what;
-      EXPECT_EQ(outcome.err.find("runtime error"), outcome.err.npos) << what;
+      RunOn(host, command.Live(), {.environment = {"ASAN_OPTIONS=allocator_may_return_null=1"}});
     }
     // The folder holds files only, and nothing stands beside it but what the test made.
-    for (const auto &entry : std::filesystem::directory_iterator(Scratch() + "/folder")) {
+    for (const auto &entry : std::filesystem::directory_iterator(folder_)) {
       EXPECT_TRUE(entry.is_regular_file()) << entry.path();
     }
     for (const auto &entry : std::filesystem::directory_iterator(Scratch())) {
@@ -93,7 +93,7 @@ class Hostile : public HostTest {
         arguments.push_back(const_cast<char *>(argument.c_str()));
       }
       arguments.push_back(nullptr);
-      if (chdir((Scratch() + "/folder").c_str()) == 0) execv(arguments[0], arguments.data());
+      if (chdir(folder_.c_str()) == 0) execv(arguments[0], arguments.data());
       _exit(127);
     }
     std::string shown;
@@ -110,12 +110,10 @@ class Hostile : public HostTest {
 TEST_F(Hostile, EscapesAreNotShownOnATerminal) {
   const std::string host = Record(WithTexts(kEscape));
   for (const Command &command : kCommands) {
-    std::string shown = OnTerminal(CommandLine(command), host);
+    std::string shown = OnTerminal(command.Live(), host);
     // The tree of ps is drawn with escapes of its own.
-    if (command.arguments[0] == "ps" && shown.starts_with("\x1b)0")) shown.erase(0, 3);
-    for (const char bad : {'\x1b', '\x07', '\x7f', '\x9b'}) {
-      EXPECT_EQ(shown.find(bad), shown.npos) << Describe(command.arguments) << "\n" << shown;
-    }
+    if (command.Tool() == "ps" && shown.starts_with("\x1b)0")) shown.erase(0, 3);
+    EXPECT_EQ(shown.find_first_of("\x1b\x07\x7f\x9b"), shown.npos) << command.line << shown;
   }
 }
 
@@ -128,30 +126,13 @@ TEST_F(Hostile, Texts) {
 }
 
 TEST_F(Hostile, TextsWithoutAnEnd) {
-  RunAll(
-      "list world = 1\nlist userworld_cartel = 1\nrecord world_name 1 = name=" + Filling(128) +
-      "\nrecord world_info 1 = worldID=1 cartelID=1 worldType=4\n"
-      "record sched_Vcpus_stats_affinity 1 = cpuText=" +
-      Filling(2304) + "\nrecord userworld_cartel_cmdline 1 = cmdline=" + Filling(1024) +
-      "\nlist userworld_cartel_fd_fds 1 = 1\nrecord userworld_cartel_fd_fds 1 1 = kind=" +
-      Filling(96) + " description=" + Filling(1984) +
-      "\nlist userworld_cartel_mem_mmaps 1 = 1\n"
-      "record userworld_cartel_mem_mmaps 1 1 = kind=2 description=" +
-      Filling(2008) + "\nrecord system_version = product=" + Filling(32) +
-      " version=" + Filling(64) + " releaseLevel=" + Filling(64) + " update=" + Filling(132) +
-      "\nrecord system_bootCmdLine = commandLine=" + Filling(4096) +
-      "\nrecord system_bootMAC = address=" + Filling(24) +
-      "\nlist system_modules = 1\nrecord system_modules_general 1 = moduleID=1 name=" +
-      Filling(288) +
-      "\nlist hardware_pci_seg = 0\nlist hardware_pci_seg_bus 0 = 0\n"
-      "list hardware_pci_seg_bus_slot 0 0 = 31\nlist hardware_pci_seg_bus_slot_func 0 0 31 = 2\n"
-      "record hardware_pci_seg_bus_slot_func_pciConfigHeader 0 0 31 2 = mFlags=2 moduleID=1 name=" +
-      Filling(33) +
-      "\nlist system_morelfs_inodes = 1\nrecord system_morelfs_inodes_stats 1 = linkState=-4 "
-      "tardisk=" +
-      Filling(128) + " ramdisk=" + Filling(128) + " name=" + Filling(256) +
-      "\nlist hardware_acpi_tables = 1\nlist hardware_acpi_tables_buffers 1 = 0\n"
-      "record hardware_acpi_tables_buffers 1 0 = signature=\"/../\" @4:u8=255 length=1\n");
+  std::string host = kFilledFields;
+  for (size_t at; (at = host.find('~')) != host.npos;) {
+    const size_t digits = host.find_first_not_of("0123456789", at + 1) - at - 1;
+    const std::string filling(std::stoul(host.substr(at + 1, digits)), 'z');
+    host.replace(at, digits + 1, '"' + filling + '"');
+  }
+  RunAll(host);
   EXPECT_FALSE(std::filesystem::exists(Scratch() + "/.aml"));
 }
 
@@ -159,33 +140,37 @@ TEST_F(Hostile, CountsAndLengthsAtTheirLimits) {
   std::vector<std::string> numbers = {"2147483648", "4294967295"};
   if (IsLong()) numbers.insert(numbers.end(), {"0", "1", "2147483647"});
   for (const std::string &n : numbers) {
-    std::string host = Changed("^record (?!.*(pciConfigHeader|_rtc|bootOption|cpuInfo|Usage))",
-                               "(\\w*[A-Za-z])=[0-9]+|$1=" + n);
-    host = Changed("^list .*= [0-9 ]+$", "$| " + n, host);
-    host = Changed("^content .*abc", "$| length " + n, host);
-    host = Changed("pciConfigHeader.*classCode", "=.*|= classCode=65535 infoFlags=255 mFlags=255",
-                   host);
-    host = Changed("mmaps 5", "kind=\\w+|kind=2", host);
-    host = Changed("usedTime", "=\\w+|=18446744073709551615", host);
-    host = Changed("cpuInfo", "=2|=1000", host);
-    RunAll(Changed("cookieList =", "33|33 -1 9223372036854775807", host));
-    std::filesystem::remove_all(Scratch() + "/folder");
+    std::string host = whole_;
+    for (const auto &[lines, change] : std::vector<std::pair<std::string, std::string>>{
+             {"^record (?!.*(pciConfigHeader|_rtc|bootOption|cpuInfo|Usage))",
+              "(\\w*[A-Za-z])=[0-9]+|$1=" + n},
+             {"^list .*= [0-9 ]+$", "$| " + n},
+             {"^content .*abc", "$| length " + n},
+             {"pciConfigHeader.*classCode", "=.*|= classCode=65535 infoFlags=255 mFlags=255"},
+             {"mmaps 5", "kind=\\w+|kind=2"},
+             {"usedTime", "=\\w+|=18446744073709551615"},
+             {"cpuInfo", "=2|=1000"},
+             {"cookieList =", "33|33 -1 9223372036854775807"}}) {
+      host = Changed(lines, change, host);
+    }
+    RunAll(host);
+    std::filesystem::remove_all(folder_);
     WriteFile("folder/file", "");
   }
 }
 
 TEST_F(Hostile, InstancesOfTheWrongType) {
-  std::string host;
-  for (const char *list :
+  std::string host = "record hardware_cpu_cpuInfo = numPcpus=2\n";
+  for (const std::string list :
        {"world", "userworld_cartel", "hardware_pci_seg", "system_modules",
         "hardware_interrupts_cookieList", "hardware_acpi_tables", "system_morelfs_inodes"}) {
-    host += std::string("list ") + list + " = \"text\" null \"\"\n";
+    host += "list " + list + " = \"text\" null \"\"\n";
   }
-  for (const char *list :
+  for (const std::string list :
        {"system_morelfs_tardisks", "system_morelfs_ramdisks", "system_bootOptionFiles"}) {
-    host += std::string("list ") + list + " = 1 null -1\n";
+    host += "list " + list + " = 1 null -1\n";
   }
-  RunAll(host + "record hardware_cpu_cpuInfo = numPcpus=2\n");
+  RunAll(host);
 }
 
 TEST_F(Hostile, CyclesAndStrangers) {
@@ -207,23 +192,16 @@ TEST_F(Hostile, CyclesAndStrangers) {
 
 // What still opens of a damaged file is safe to read with every tool.
 TEST_F(Hostile, FilesCutAndFlipped) {
-  const std::string whole = ReadFile(Record(kWholeHost));
+  const std::string whole = ReadFile(Record(whole_));
   const size_t step = IsLong() ? 1 : 397;
-  const std::string path = Scratch() + "/host.kif";
   size_t tool = 0;
   for (size_t place = 0; place < whole.size(); place += step) {
     std::string flipped = whole;
     flipped[place] = static_cast<char>(flipped[place] ^ (1 << place % 8));
     for (const std::string &bytes : {whole.substr(0, place), flipped}) {
-      WriteFile("host.kif", bytes);
+      const std::string file = WriteFile("host.kif", bytes);
       const Command &command = kCommands[++tool % kCommands.size()];
-      if (!command.onCache) continue;
-      std::vector<std::string> commandLine = {BIN_DIR "/zlkkiftools", "-c", path};
-      commandLine.insert(commandLine.end(), command.arguments.begin(), command.arguments.end());
-      const Outcome outcome = Run(
-          commandLine, {.environment = {"ZELLIBS_HOST=none"}, .directory = Scratch() + "/folder"});
-      EXPECT_GE(outcome.status, 0) << Describe(command.arguments) << " at " << place;
-      EXPECT_EQ(outcome.err.find("Sanitizer"), outcome.err.npos) << outcome.err;
+      if (command.onCache) RunOn("none", command.Cached(file));
     }
   }
 }
