@@ -9,14 +9,12 @@
 // library operation, "allocations" for every allocation, here from inside of libraries too. They
 // are counted from the beginning of main.
 #include <dlfcn.h>
-#include <elf.h>
 #include <errno.h>
 #include <fcntl.h>
 #include <link.h>
 #include <stdint.h>
 #include <stdlib.h>
 #include <string.h>
-#include <sys/auxv.h>
 #include <sys/mman.h>
 #include <unistd.h>
 
@@ -24,23 +22,12 @@
 
 namespace {
 
-// Whether `address` lies in the program's own code. Asks the loader nothing: it may be at work.
+// Whether `address` lies in the program's own code. Waits for no lock of the loader, which may be
+// at work.
 bool IsInProgram(const void *address) {
-  const auto *headers = reinterpret_cast<const ElfW(Phdr) *>(getauxval(AT_PHDR));
-  const size_t count = getauxval(AT_PHNUM);
-  uintptr_t base = 0;
-  for (size_t i = 0; i < count; ++i) {
-    if (headers[i].p_type == PT_PHDR) {
-      base = reinterpret_cast<uintptr_t>(headers) - headers[i].p_vaddr;
-    }
-  }
-  const auto place = reinterpret_cast<uintptr_t>(address);
-  for (size_t i = 0; i < count; ++i) {
-    if (headers[i].p_type != PT_LOAD || (headers[i].p_flags & PF_X) == 0) continue;
-    const uintptr_t start = base + headers[i].p_vaddr;
-    if (place >= start && place < start + headers[i].p_memsz) return true;
-  }
-  return false;
+  dl_find_object object;
+  return _dl_find_object(const_cast<void *>(address), &object) == 0 &&
+         object.dlfo_link_map->l_name[0] == '\0';
 }
 
 uint32_t NumberFrom(const char *variable, uint32_t otherwise) {
@@ -104,46 +91,36 @@ Operation *Next(const char *name) {
     const bool fails = Fails(#name, Kind::kOperation, __builtin_return_address(0)); \
     return fails ? failure : next arguments;                                        \
   }
+// The parameters are of the types A to E.
+#define ONE(Result, name, failure, A) OPERATION(Result, name, failure, (A a), (a))
+#define TWO(Result, name, failure, A, B) OPERATION(Result, name, failure, (A a, B b), (a, b))
+#define THREE(Result, name, failure, A, B, C) \
+  OPERATION(Result, name, failure, (A a, B b, C c), (a, b, c))
+#define FOUR(name, A, B, C, D) \
+  OPERATION(KIF_Status, name, FailStatus(), (A a, B b, C c, D d), (a, b, c, d))
 
-OPERATION(KIF_Status, KIF_Get, FailStatus(),
-          (uint32_t node, KIF_ParamList *instance, void *buffer, uint32_t size),
-          (node, instance, buffer, size))
+FOUR(KIF_Get, uint32_t, KIF_ParamList *, void *, uint32_t)
 OPERATION(KIF_Status, KIF_Set, FailStatus(),
           (uint32_t node, KIF_ParamList *instance, KIF_ParamList *input, void *output,
            uint32_t size),
           (node, instance, input, output, size))
-OPERATION(KIF_Status, KIF_GetDataLength, FailStatus(),
-          (uint32_t node, KIF_ParamList *instance, uint32_t *length), (node, instance, length))
-OPERATION(KIF_Status, KIF_SetData, FailStatus(),
-          (uint32_t node, KIF_ParamList *instance, KIFData *input, KIFData *output),
-          (node, instance, input, output))
-OPERATION(KIF_Status, KIF_GetInstanceListAlloc, FailStatus(),
-          (uint32_t node, KIF_ParamList *parent, KIF_ParamList **list), (node, parent, list))
-OPERATION(KIF_Status, KIF_GetInstanceListAllocHint, FailStatus(),
-          (uint32_t node, KIF_ParamList *parent, uint32_t hint, KIF_ParamList **list),
-          (node, parent, hint, list))
-OPERATION(KIFData *, KIFData_Create, nullptr,
-          (uint32_t capacity, const void *bytes, uint32_t length), (capacity, bytes, length))
-OPERATION(void *, KIFData_GetData, nullptr, (KIFData * data), (data))
-OPERATION(KIF_ParamList *, KIF_ParamListCreate, nullptr, (uint32_t kind, uint32_t size),
-          (kind, size))
-OPERATION(KIF_Status, KIF_ParamListAddInt, FailStatus(), (KIF_ParamList * list, int64_t value),
-          (list, value))
-OPERATION(KIF_Status, KIF_ParamListAddString, FailStatus(),
-          (KIF_ParamList * list, const char *text), (list, text))
-OPERATION(KIF_Param *, KIF_ParamListGetParam, nullptr, (KIF_ParamList * list, uint32_t index),
-          (list, index))
-OPERATION(KIF_Status, KIF_ParamListGetInt32, FailStatus(),
-          (KIF_ParamList * list, uint32_t index, int32_t *value), (list, index, value))
-OPERATION(KIF_Status, KIF_ParamListGetUInt64, FailStatus(),
-          (KIF_ParamList * list, uint32_t index, uint64_t *value), (list, index, value))
-OPERATION(KIF_Status, KIF_ParamListGetString, FailStatus(),
-          (KIF_ParamList * list, uint32_t index, const char **text), (list, index, text))
-OPERATION(const char *, KIF_ParamGetString, nullptr, (KIF_Param * param), (param))
-OPERATION(KIF_Status, KIF_UseCache, FailStatus(), (const char *path, uint32_t flags), (path, flags))
-OPERATION(KIF_Status, KIF_CheckSig, FailStatus(),
-          (char *kernelBuildDate, uint32_t size, const char **programBuildDate),
-          (kernelBuildDate, size, programBuildDate))
+FOUR(KIF_SetData, uint32_t, KIF_ParamList *, KIFData *, KIFData *)
+FOUR(KIF_GetInstanceListAllocHint, uint32_t, KIF_ParamList *, uint32_t, KIF_ParamList **)
+THREE(KIF_Status, KIF_GetInstanceListAlloc, FailStatus(), uint32_t, KIF_ParamList *,
+      KIF_ParamList **)
+THREE(KIF_Status, KIF_GetDataLength, FailStatus(), uint32_t, KIF_ParamList *, uint32_t *)
+THREE(KIF_Status, KIF_CheckSig, FailStatus(), char *, uint32_t, const char **)
+THREE(KIF_Status, KIF_ParamListGetInt32, FailStatus(), KIF_ParamList *, uint32_t, int32_t *)
+THREE(KIF_Status, KIF_ParamListGetUInt64, FailStatus(), KIF_ParamList *, uint32_t, uint64_t *)
+THREE(KIF_Status, KIF_ParamListGetString, FailStatus(), KIF_ParamList *, uint32_t, const char **)
+THREE(KIFData *, KIFData_Create, nullptr, uint32_t, const void *, uint32_t)
+TWO(KIF_ParamList *, KIF_ParamListCreate, nullptr, uint32_t, uint32_t)
+TWO(KIF_Status, KIF_ParamListAddInt, FailStatus(), KIF_ParamList *, int64_t)
+TWO(KIF_Status, KIF_ParamListAddString, FailStatus(), KIF_ParamList *, const char *)
+TWO(KIF_Param *, KIF_ParamListGetParam, nullptr, KIF_ParamList *, uint32_t)
+TWO(KIF_Status, KIF_UseCache, FailStatus(), const char *, uint32_t)
+ONE(void *, KIFData_GetData, nullptr, KIFData *)
+ONE(const char *, KIF_ParamGetString, nullptr, KIF_Param *)
 
 // dlsym() allocates, so the allocator is reached by its other names. With the address sanitizer it
 // is the sanitizer's.
