@@ -118,8 +118,14 @@ const char *InputName(const char *path) {
 }
 
 bool InputText::Read(const char *path) {
-  const bool isInput = IsStandardStream(path);
-  const int descriptor = isInput ? STDIN_FILENO : open(path, O_RDONLY | O_CLOEXEC);
+  const bool isInput = IsStandardStream(path) || strcmp(path, kStandardInput) == 0;
+  const int descriptor = isInput ? STDIN_FILENO : open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+  struct stat status;
+  if (!isInput && descriptor != -1 && fstat(descriptor, &status) == 0 && !S_ISREG(status.st_mode) &&
+      !S_ISDIR(status.st_mode)) {
+    close(descriptor);
+    return Complain(path, "not a regular file: only - waits for a pipe");
+  }
   const int error = descriptor == -1 ? errno : read_.ReadAll(descriptor, kMostText);
   if (!isInput && descriptor != -1) close(descriptor);
   if (error != 0) return Complain(InputName(path), strerror(error));
