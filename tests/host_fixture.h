@@ -37,7 +37,7 @@ class HostTest : public testing::Test {
   // A path without blanks or colons, which LD_PRELOAD cannot take, of a library of the test build:
   //   FAULT_INJECT   makes calls of the program fail (fault/fault.h)
   //   HWDATA_FOLDER  gives it PCI ID files from the folder that the variable HWDATA_FOLDER names,
-  //                  in place of those in /usr/share/hwdata (pci/pci_ids_test.cc)
+  //                  in place of those in /usr/share/hwdata (pci/pci-ids/)
   //   OWN_SIGNALS    lets it signal no process but those of the test (worlds/own_signals.cc)
   //   LSTAT_DEVICE   makes files look like those of the in-memory file system (fsstats/)
   std::string Preload(const std::string &library) { return Link(library); }
