@@ -10,6 +10,7 @@
 #include "cache_file.h"
 #include "messages.h"
 #include "output.h"
+#include "visit.h"
 
 namespace {
 
@@ -191,6 +192,23 @@ flatbuffers::DetachedBuffer ContentBuilder::Build() {
   return builder_.Release();
 }
 
+class NullVisitor : public Visitor {
+  void OnHost(const Facts &) override {}
+  void OnList(const VisitedNode &, const Values &, KIF_Status, const Values &) override {}
+  void OnRecord(const VisitedNode &, const Values &, KIF_Status, std::string_view) override {}
+  void OnContent(const VisitedNode &, const Values &, const cache::Stored &,
+                 std::string_view) override {}
+  void OnSet(const VisitedNode &, KIF_Status) override {}
+};
+
+// What is written is what every reader takes.
+bool IsAccepted(const FileBytes &bytes, std::string *problem) {
+  CacheFile file;
+  NullVisitor visitor;
+  *problem = "the whole";
+  return OpenCacheBytes(bytes, &file) == 0 && VisitAll(file, &visitor, problem);
+}
+
 }  // namespace
 
 bool WriteCacheFile(const HostModel &model, const char *path) {
@@ -205,5 +223,9 @@ bool WriteCacheFile(const HostModel &model, const char *path) {
   cache::FinishFileBuffer(
       builder, cache::CreateFile(builder, kCacheMajorVersion, model.facts.minorVersion, checksum,
                                  contentAt));
+  std::string problem;
+  if (!IsAccepted({builder.GetBufferPointer(), builder.GetSize()}, &problem)) {
+    return Complain(path, "no reader would accept this host: too many or too long: " + problem);
+  }
   return WriteRecording(path, builder.GetBufferPointer(), builder.GetSize());
 }

@@ -11,6 +11,7 @@
 #include <cstring>
 #include <set>
 
+#include "cache_bounds.h"
 #include "kif/kif.h"
 #include "progress.h"
 #include "records/platform.h"
@@ -268,6 +269,8 @@ void Recorder::RecordList(const NodeInfo &node, const Values &parent, Values *en
       ++omitted_[IndexOf(node)];
     }
   }
+  // A tree of files may name a process twice.
+  if (EntriesSelect(node)) DropRepeated(entries);
   if (status == KIF_STATUS_NO_PERMISSION) ++refused_[IndexOf(node)];
   model_->AddList(models_[IndexOf(node)], parent, status, *entries);
 }

@@ -4,9 +4,11 @@
 #include <cstring>
 #include <iterator>
 
+#include "cache_bounds.h"
 #include "description_text.h"
 #include "progress.h"
 #include "text_lexer.h"
+#include "visit.h"
 
 namespace {
 
@@ -264,6 +266,10 @@ bool Reader::ReadList() {
     while (!AtEnd()) {
       if (!ReadValue(&entries_.emplace_back())) return false;
     }
+  }
+  const NodeInfo *known = FindNodeByPath(node->path.c_str(), node->path.size());
+  if (known != nullptr && EntriesSelect(*known) && !StandOnce(entries_)) {
+    return Fail("an entry of the list stands there twice");
   }
   model_->AddList(node->model, values_, status, entries_, lineNumber_);
   return true;

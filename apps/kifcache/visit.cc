@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cstring>
 
+#include "cache_bounds.h"
+
 namespace {
 
 // Of moments and lacks: there are a few for each node.
@@ -67,10 +69,19 @@ Facts FactsOf(const CacheFile &file) {
   facts.recorderCartel = recording.recorder_cartel();
   facts.begin = recording.begin();
   facts.end = recording.end();
-  if (recording.omitted() != nullptr) {
-    for (const auto *text : *recording.omitted()) facts.omitted.emplace_back(text->c_str());
-  }
   return facts;
+}
+
+// The file has each text once, and so they are shorter than it.
+bool AddOmitted(const CacheFile &file, Facts *facts) {
+  const auto *all = file.content->recording()->omitted();
+  uint64_t size = 0;
+  for (uint32_t i = 0; all != nullptr && i < all->size(); ++i) {
+    size += all->Get(i)->size() + sizeof(flatbuffers::uoffset_t);
+    if (size > file.size) return false;
+    facts->omitted.emplace_back(all->Get(i)->c_str());
+  }
+  return true;
 }
 
 class Walk {
@@ -97,12 +108,13 @@ class Walk {
   Values selector_;
   Values entries_;
   uint64_t spent_ = 0;
+  uint64_t fullSize_ = 0;  // of all records
 };
 
 // A file may show the same bytes any number of times; what no writer accepts is damaged.
 bool Walk::Spend(uint64_t size) {
   spent_ += size;
-  return spent_ <= kMostModelSize;
+  return spent_ <= kMostModelSize && RecordsAreWithinBounds(file_, spent_, 1);
 }
 
 bool Walk::Decode(uint32_t first, uint32_t count, Values *values) {
@@ -137,6 +149,8 @@ bool Walk::Decode(uint32_t place, uint32_t length, std::string_view *bytes) {
 
 bool Walk::Show(const VisitedNode &node, const cache::List &list) {
   if (!Decode(list.first(), list.count(), &entries_)) return false;
+  const NodeInfo *known = FindNodeByPath(node.path, strlen(node.path));
+  if (known != nullptr && !StandOnce(entries_) && EntriesSelect(*known)) return false;
   visitor_->OnList(node, selector_, list.status(), entries_);
   return true;
 }
@@ -188,6 +202,9 @@ bool Walk::Node(uint32_t place) {
   const cache::Node &node = *file_.content->nodes()->Get(place);
   VisitedNode visited = {};
   if (!Describe(place, &visited)) return false;
+  const uint64_t records = node.records() != nullptr ? node.records()->size() : 0;
+  if (visited.description != nullptr) fullSize_ += records * visited.description->recordSize;
+  if (!RecordsAreWithinBounds(file_, fullSize_, 1)) return false;
   visitor_->OnNode(visited);
   if (!ShowAll(visited, node.lists()) || !ShowAll(visited, node.records()) ||
       !ShowAll(visited, node.contents())) {
@@ -199,10 +216,22 @@ bool Walk::Node(uint32_t place) {
 
 }  // namespace
 
+bool StandOnce(const Values &entries) {
+  const auto isRepeated = [](const Value &a, const Value &b) { return !(a < b); };
+  if (std::adjacent_find(entries.begin(), entries.end(), isRepeated) == entries.end()) return true;
+  Values sorted = entries;
+  std::sort(sorted.begin(), sorted.end());
+  return std::adjacent_find(sorted.begin(), sorted.end(), isRepeated) == sorted.end();
+}
+
 bool VisitAll(const CacheFile &file, Visitor *visitor, std::string *problem) {
   Facts facts = FactsOf(file);
-  if (!AddMoments(file, &facts) || !AddLacks(file, &facts)) {
+  if (!AddMoments(file, &facts) || !AddLacks(file, &facts) || !AddOmitted(file, &facts)) {
     *problem = "the recording";
+    return false;
+  }
+  if (!ListsAreWithinBounds(file)) {
+    *problem = "the lists";
     return false;
   }
   visitor->OnHost(facts);

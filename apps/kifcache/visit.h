@@ -15,6 +15,9 @@ struct VisitedNode {
   std::string_view words;  // the file's own description in words
 };
 
+// Whether no two of a list's entries are the same.
+bool StandOnce(const Values &entries);
+
 class Visitor {
  public:
   virtual ~Visitor() = default;

@@ -1,17 +1,22 @@
 // The recorded host: the answers of a cache file.
+#include <algorithm>
 #include <cstring>
 
+#include "base/array.h"
+#include "cache_bounds.h"
 #include "cache_file.h"
 #include "host.h"
 #include "param_list.h"
+#include "records/platform.h"
 #include "status.h"
 
 namespace {
 
-// A file may name one text any number of times; what a list's texts take in memory has an end.
-constexpr size_t kMostListText = size_t{64} << 20;
-
 CacheFile recording;
+
+// Whether the lists of the file are within bounds; known since the first of them was asked for.
+enum class Bounds : uint8_t { kUnknown, kKept, kBroken };
+Bounds bounds;
 
 // The answers of a node, looked up in the file when the node is first asked for.
 struct Answers {
@@ -21,6 +26,7 @@ struct Answers {
   // next one is tried first.
   uint32_t recordHint;
   uint32_t listHint;
+  bool tooManyRecords;
 };
 Answers answersByNode[kNodeCount];
 
@@ -30,6 +36,9 @@ Answers *AnswersOf(const NodeInfo &node) {
     const auto *nodes = recording.content->nodes();
     answers->node = nodes != nullptr ? nodes->LookupByKey(node.path) : nullptr;
     answers->lookedUp = true;
+    const auto *records = answers->node != nullptr ? answers->node->records() : nullptr;
+    answers->tooManyRecords = records != nullptr && !RecordsAreWithinBounds(
+                                                        recording, records->size(), node.recordSize);
   }
   return answers;
 }
@@ -95,9 +104,32 @@ KIF_Status Find(const flatbuffers::Vector<const Answer *> *answers, const KIF_Pa
   return KIF_STATUS_NOT_FOUND;
 }
 
+// The table of interrupts has a cell for each of them and each processor.
+bool FitsInterrupts(uint32_t cpus) {
+  constexpr uint64_t kMostEmptyCells = 1000000;
+  const cache::Node *list = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList])->node;
+  const cache::Node *cells = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList_PCPU])->node;
+  uint64_t interrupts = 0;
+  if (list != nullptr && list->lists() != nullptr) {
+    for (const cache::List *all : *list->lists()) interrupts += all->count();
+  }
+  const auto *counts = cells != nullptr ? cells->records() : nullptr;
+  return interrupts * cpus <= kMostEmptyCells + 16 * uint64_t{counts != nullptr ? counts->size() : 0};
+}
+
+// Whether a record that says how many processors there are can be followed.
+bool IsCredible(const NodeInfo &node, const void *record) {
+  if (IndexOf(node) == kNode_hardware_cpu_cpuInfo) {
+    const uint32_t cpus = static_cast<const CpuInfo *>(record)->numPcpus;
+    return cpus <= kMostCpus && FitsInterrupts(cpus);
+  }
+  return true;
+}
+
 KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
   Answers *answers = AnswersOf(node);
   if (answers->node == nullptr) return KIF_STATUS_NOT_FOUND;
+  if (answers->tooManyRecords) return KIF_STATUS_DAMAGED_CACHE_FILE;
   const cache::Record *answer;
   const KIF_Status status = Find(answers->node->records(), instance, &answers->recordHint, &answer);
   if (status != KIF_STATUS_OK) return status;
@@ -109,10 +141,10 @@ KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
   if (length > 0) memcpy(record, recording.bytes + answer->place(), length);
-  return KIF_STATUS_OK;
+  return IsCredible(node, record) ? KIF_STATUS_OK : KIF_STATUS_DAMAGED_CACHE_FILE;
 }
 
-KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list, size_t *textSize) {
+KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list) {
   switch (entry.kind()) {
     case cache::Kind::Integer:
       return KIF_ParamListAddInt(list, entry.value());
@@ -120,12 +152,35 @@ KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list, size_t *te
       return KIF_ParamListAddString(list, nullptr);
     case cache::Kind::Text: {
       const char *text = ParameterText(recording, entry);
-      *textSize += entry.length();
-      if (text == nullptr || *textSize > kMostListText) return KIF_STATUS_DAMAGED_CACHE_FILE;
-      return KIF_ParamListAddString(list, text);
+      return text != nullptr ? KIF_ParamListAddString(list, text) : KIF_STATUS_DAMAGED_CACHE_FILE;
     }
   }
   return KIF_STATUS_DAMAGED_CACHE_FILE;
+}
+
+int Compare(const Param &a, const Param &b) {
+  if (a.type != b.type) return a.type < b.type ? -1 : 1;
+  if (a.type != KIF_PARAM_STRING) return a.integer < b.integer ? -1 : a.integer > b.integer ? 1 : 0;
+  if (a.text == nullptr || b.text == nullptr) return (a.text != nullptr) - (b.text != nullptr);
+  return strcmp(a.text, b.text);
+}
+
+// Lists are ascending, mostly.
+KIF_Status CheckEntriesStandOnce(const NodeInfo &node, const KIF_ParamList &list) {
+  uint32_t ascending = 1;
+  while (ascending < list.count && Compare(list.params[ascending - 1], list.params[ascending]) < 0) {
+    ++ascending;
+  }
+  if (ascending >= list.count || !EntriesSelect(node)) return KIF_STATUS_OK;
+  Array<const Param *> sorted;
+  if (!sorted.Reserve(list.count)) return KIF_STATUS_NO_MEMORY;
+  for (uint32_t i = 0; i < list.count; ++i) sorted.Append(&list.params[i]);
+  std::sort(sorted.begin(), sorted.end(),
+            [](const Param *a, const Param *b) { return Compare(*a, *b) < 0; });
+  for (uint32_t i = 1; i < list.count; ++i) {
+    if (Compare(*sorted[i - 1], *sorted[i]) == 0) return KIF_STATUS_DAMAGED_CACHE_FILE;
+  }
+  return KIF_STATUS_OK;
 }
 
 KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list) {
@@ -135,15 +190,17 @@ KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_P
   KIF_Status status = Find(answers->node->lists(), parent, &answers->listHint, &answer);
   if (status != KIF_STATUS_OK) return status;
   if (answer->status() != KIF_STATUS_OK) return answer->status();
-  if (!HasParameters(recording, answer->first(), answer->count())) {
+  if (bounds == Bounds::kUnknown) {
+    bounds = ListsAreWithinBounds(recording) ? Bounds::kKept : Bounds::kBroken;
+  }
+  if (bounds == Bounds::kBroken || !HasParameters(recording, answer->first(), answer->count())) {
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
   if (!ReserveParams(list, answer->count())) return KIF_STATUS_NO_MEMORY;
-  size_t textSize = 0;
   for (uint32_t i = 0; status == KIF_STATUS_OK && i < answer->count(); ++i) {
-    status = Append(recording.parameters[answer->first() + i], list, &textSize);
+    status = Append(recording.parameters[answer->first() + i], list);
   }
-  return status;
+  return status == KIF_STATUS_OK ? CheckEntriesStandOnce(node, *list) : status;
 }
 
 KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance,
@@ -207,6 +264,7 @@ KIF_Status OpenRecordedHost(const char *path, const Host **host) {
   CloseCacheFile(&recording);
   recording = opened;
   memset(answersByNode, 0, sizeof(answersByNode));
+  bounds = Bounds::kUnknown;
   *host = &kRecordedHost;
   return KIF_STATUS_OK;
 }

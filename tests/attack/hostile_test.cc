@@ -174,14 +174,14 @@ TEST_F(Hostile, InstancesOfTheWrongType) {
 }
 
 TEST_F(Hostile, CyclesAndStrangers) {
-  std::string host = "list world = 1 2 3 3 4 5\nlist userworld_cartel = 1 1 9\n";
+  std::string host = "list world = 1 2 3 4 5\nlist userworld_cartel = 1 9\n";
   const int parents[] = {2, 1, 3, 77, 3};
   for (int world = 1; world <= 5; ++world) {
     const std::string id = std::to_string(world);
     host += "record world_name " + id + " = name=\"w\"\nrecord world_info " + id +
             " = worldID=" + id + " cartelID=" + id +
             " userspaceID=1 worldType=4 parentCartelID=" + std::to_string(parents[world - 1]) +
-            "\nlist userworld_cartel_child " + id + " = 1 2 3 " + id +
+            "\nlist userworld_cartel_child " + id + " = " + (world > 1 ? "1 " : "") + id +
             "\nrecord userworld_cartel_child " + id + " " + id + " = childState=1\n";
     if (world > 1) host += "record userworld_cartel_child " + id + " 1 = childState=1\n";
   }
