@@ -1,37 +1,32 @@
 // Any bytes as the text form of a host. What can be read makes a whole cache file, and the dump of
 // that makes the same file again.
-#include <stdio.h>
-#include <stdlib.h>
-#include <unistd.h>
-
-#include <string>
+#include <fstream>
+#include <iterator>
 
 #include "cache_file.h"
 #include "cache_writer.h"
 #include "check.h"
 #include "host_model.h"
+#include "surroundings.h"
 #include "text_reader.h"
 #include "text_writer.h"
 
 namespace {
 
 FILE *nowhere;
-char folder[] = "/dev/shm/text_fuzz.XXXXXX";
 std::string path;
 
 std::string Build(const HostModel &model) {
   if (!WriteCacheFile(model, path.c_str())) abort();
-  std::string bytes;
-  FILE *file = fopen(path.c_str(), "r");
-  for (int byte = getc(file); byte != EOF; byte = getc(file)) bytes += static_cast<char>(byte);
-  fclose(file);
-  return bytes;
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
 }
 
 std::string Dump() {
   CacheFile file;
   std::string problem;
-  if (OpenCacheFile(path.c_str(), &file) != 0 || !CheckFile(path.c_str(), file, true, nowhere)) abort();
+  if (OpenCacheFile(path.c_str(), &file) != 0 || !CheckFile(path.c_str(), file, true, nowhere))
+    abort();
   char *text = nullptr;
   size_t size = 0;
   FILE *stream = open_memstream(&text, &size);
@@ -44,19 +39,13 @@ std::string Dump() {
   return dump;
 }
 
-void RemoveFolder() {
-  unlink(path.c_str());
-  rmdir(folder);
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  if (mkdtemp(folder) == nullptr) return 1;
-  path = std::string(folder) + "/host.kif";
-  atexit(RemoveFolder);
-  stderr = nowhere = fopen("/dev/null", "w");  // the messages; the fuzzer writes to descriptor 2
-  return nowhere != nullptr ? 0 : 1;
+  MakeFolder();
+  path = folder + "/host.kif";
+  nowhere = Silence();
+  return 0;
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {

@@ -2,33 +2,27 @@
 
 #include <errno.h>
 #include <fcntl.h>
-#include <poll.h>
 #include <stdlib.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
+#include <future>
 #include <sstream>
 
 namespace {
 
-// A pipe whose ends close with it.
-struct Pipe {
-  int ends[2] = {-1, -1};
-  Pipe() {
-    if (pipe2(ends, O_CLOEXEC) != 0) abort();
+// All that comes out of a pipe, whose end is closed then.
+std::string Drain(int end) {
+  std::string text;
+  char block[65536];
+  for (ssize_t got; (got = read(end, block, sizeof(block))) > 0;) {
+    text.append(block, static_cast<size_t>(got));
   }
-  ~Pipe() {
-    Close(0);
-    Close(1);
-  }
-  void Close(int end) {
-    if (ends[end] >= 0) close(ends[end]);
-    ends[end] = -1;
-  }
-};
+  close(end);
+  return text;
+}
 
 std::vector<char *> Pointers(const std::vector<std::string> &texts) {
   std::vector<char *> pointers;
@@ -44,30 +38,6 @@ std::vector<std::string> Environment(const std::vector<std::string> &added) {
                      {"PATH=/usr/sbin:/usr/bin:/sbin:/bin", "TZ=UTC", "BIN_DIR=" BIN_DIR,
                       "LIB_DIR=" LIB_DIR, "ASAN_OPTIONS=detect_leaks=1"});
   return environment;
-}
-
-// Feeds `input` to the child and takes what it writes, until it has closed both streams.
-void Exchange(const std::string &input, Pipe *in, Pipe *out, Pipe *err, Outcome *outcome) {
-  size_t fed = 0;
-  while (out->ends[0] >= 0 || err->ends[0] >= 0) {
-    if (fed == input.size()) in->Close(1);
-    pollfd waits[3] = {
-        {out->ends[0], POLLIN, 0}, {err->ends[0], POLLIN, 0}, {in->ends[1], POLLOUT, 0}};
-    if (poll(waits, 3, -1) < 0 && errno != EINTR) abort();
-    Pipe *pipes[2] = {out, err};
-    std::string *texts[2] = {&outcome->out, &outcome->err};
-    for (int i = 0; i < 2; ++i) {
-      if (waits[i].fd < 0 || waits[i].revents == 0) continue;
-      char block[65536];
-      const ssize_t got = read(waits[i].fd, block, sizeof(block));
-      if (got > 0) texts[i]->append(block, static_cast<size_t>(got));
-      if (got == 0) pipes[i]->Close(0);
-    }
-    if (waits[2].fd >= 0 && waits[2].revents != 0) {
-      const ssize_t put = write(waits[2].fd, input.data() + fed, input.size() - fed);
-      fed = put > 0 ? fed + static_cast<size_t>(put) : input.size();
-    }
-  }
 }
 
 }  // namespace
@@ -106,22 +76,22 @@ Outcome HostTest::Run(const std::vector<std::string> &commandLine, Surroundings 
   const std::vector<std::string> environment = Environment(surroundings.environment);
   std::vector<char *> arguments = Pointers(commandLine);
   std::vector<char *> variables = Pointers(environment);
-  Pipe in, out, err;
+  int out[2], err[2];
+  if (pipe2(out, O_CLOEXEC) != 0 || pipe2(err, O_CLOEXEC) != 0) abort();
   const pid_t child = fork();
   if (child == 0) {
-    dup2(in.ends[0], STDIN_FILENO);
-    dup2(out.ends[1], STDOUT_FILENO);
-    dup2(err.ends[1], STDERR_FILENO);
+    dup2(open("/dev/null", O_RDONLY | O_CLOEXEC), STDIN_FILENO);
+    dup2(out[1], STDOUT_FILENO);
+    dup2(err[1], STDERR_FILENO);
     signal(SIGPIPE, SIG_DFL);
     if (chdir(directory.c_str()) != 0) _exit(126);
     execvpe(arguments[0], arguments.data(), variables.data());
     _exit(127);
   }
-  in.Close(0);
-  out.Close(1);
-  err.Close(1);
-  Outcome outcome;
-  Exchange(surroundings.input, &in, &out, &err, &outcome);
+  close(out[1]);
+  close(err[1]);
+  std::future<std::string> messages = std::async(std::launch::async, Drain, err[0]);
+  Outcome outcome = {Drain(out[0]), messages.get()};
   int status = 0;
   while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
   }
@@ -139,24 +109,11 @@ std::string HostTest::Link(const std::string &path) {
 }
 
 std::string HostTest::ProgramsForAnyone() {
-  namespace fs = std::filesystem;
-  const fs::path programs = fs::path(scratch_) / ".programs";
-  const auto how = fs::copy_options::recursive | fs::copy_options::copy_symlinks |
-                   fs::copy_options::skip_existing;
-  std::error_code exists;
-  fs::create_directory(programs);
-  fs::copy(BIN_DIR, programs / "bin", how, exists);
-  fs::copy(LIB_DIR, programs / "lib", how, exists);
-  const auto open = fs::perms::owner_all | fs::perms::group_all | fs::perms::others_all;
-  fs::permissions(scratch_, open);
-  for (const fs::path &folder : {programs, programs / "bin", programs / "lib"}) {
-    fs::permissions(folder, open);
-  }
-  for (const char *file : {"bin/zlkkiftools", "lib/libzellibs.so"}) {
-    fs::permissions(programs / file, fs::perms::others_read | fs::perms::others_exec,
-                    fs::perm_options::add);
-  }
-  return (programs / "bin").string();
+  Run({"sh", "-c", R"(
+    mkdir -p .programs && cp -a "$BIN_DIR" "$LIB_DIR" .programs
+    chmod a+rwx . .programs .programs/*
+    chmod a+rx .programs/bin/zlkkiftools .programs/lib/libzellibs.so)"});
+  return scratch_ + "/.programs/bin";
 }
 
 std::string HostTest::WriteFile(const std::string &path, const std::string &bytes) {

@@ -17,7 +17,6 @@ struct Outcome {
 struct Surroundings {
   std::vector<std::string> environment = {};  // "NAME=value", added to the test's own
   std::string directory = {};                 // working directory; empty: the test's scratch folder
-  std::string input = {};                     // standard input
   std::vector<std::string> preloaded = {};    // libraries of the test build, see Preload()
 };
 

@@ -1,0 +1,44 @@
+// What several targets work with: a folder in memory, and no messages.
+#pragma once
+
+#include <fcntl.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <string>
+
+namespace {
+
+std::string folder = "/dev/shm/zlkkiftools-fuzz.XXXXXX";
+
+// Makes the folder, which is removed at the end; without it there is nothing to be done.
+[[maybe_unused]] void MakeFolder() {
+  if (mkdtemp(folder.data()) == nullptr) abort();
+  atexit([] {
+    std::error_code ignored;
+    std::filesystem::remove_all(folder, ignored);
+  });
+}
+
+// Writes a file of the folder, with the folders it needs.
+[[maybe_unused]] void Write(const std::string &path, const void *bytes, size_t size) {
+  constexpr int kHow = O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC;
+  int file = open((folder + path).c_str(), kHow, 0600);
+  if (file == -1) {
+    std::filesystem::create_directories(std::filesystem::path(folder + path).parent_path());
+    file = open((folder + path).c_str(), kHow, 0600);
+  }
+  if (file == -1 || write(file, bytes, size) != static_cast<ssize_t>(size)) abort();
+  close(file);
+}
+
+// The tools' messages go nowhere; what the fuzzer says goes to descriptor 2.
+[[maybe_unused]] FILE *Silence() {
+  stderr = fopen("/dev/null", "w");
+  if (stderr == nullptr) abort();
+  return stderr;
+}
+
+}  // namespace
