@@ -17,18 +17,13 @@ struct Target {
 };
 
 #define FUNCTION "/sys/bus/pci/devices/0000:00:1f.2"
+#define THREAD(id) id " (a) S 0 1 1 0 -1 0 0 0 0 0 1 2 0 0 20 0 2 0 9 9\n"
 
 constexpr Target kTargets[] = {
     {'a', "/proc/uptime", {"system_ntpclock"}, "5.5 6.6\n"},
     {'b', "/proc/loadavg", {"sched_groups"}, "0.1 0.2 0.3 1/2 3\n"},
-    {'c',
-     "/proc/1/task/1/stat",
-     {"world", "userworld_cartel", "sched_Vcpus"},
-     "1 (a) S 0 1 1 0 -1 0 0 0 0 0 1 2 0 0 20 0 2 0 9 9\n"},
-    {'d',
-     "/proc/1/task/2/stat",
-     {"world", "sched_Vcpus"},
-     "2 (b) R 0 1 1 0 -1 0 0 0 0 0 1 2 0 0 20 0 2 0 9 9\n"},
+    {'c', "/proc/1/task/1/stat", {"world", "userworld_cartel", "sched_Vcpus"}, THREAD("1")},
+    {'d', "/proc/1/task/2/stat", {"world", "sched_Vcpus"}, THREAD("2")},
     {'e', "/proc/1/cmdline", {"world", "userworld_cartel"}, "/sbin/init"},
     {'f', "/proc/1/task/1/status", {"world", "sched_Vcpus"}, "Name:\ta\nCpus_allowed_list:\t0-3\n"},
     {'g', "/proc/1/maps", {"userworld_cartel"}, "1000-2000 rw-p 00000000 00:00 0 /a\n"},
@@ -40,15 +35,9 @@ constexpr Target kTargets[] = {
     {'r', FUNCTION "/class", {"hardware_pci"}, "0x010601\n"},
     {'s', FUNCTION "/irq", {"hardware_pci"}, "16\n"},
     {'t', "/sys/bus/pci/slots/3/address", {"hardware_pci"}, "0000:00:1f\n"},
-    {'u',
-     "/proc/cmdline",
-     {"system_boot"},
-     "BOOT_IMAGE=/vmlinuz audit=1 BOOTIF=01-02-03-04-05-06-07\n"},
+    {'u', "/proc/cmdline", {"system_boot"}, "BOOT_IMAGE=/k audit=1 BOOTIF=01-02-03-04-05-06-07\n"},
     {'v', "/etc/default/grub", {"system_bootOptionFiles"}, "GRUB_TIMEOUT=5\n"},
-    {'w',
-     "/proc/version",
-     {"system_version"},
-     "Linux version 6.1 #1 SMP Debian 6.1.1-1 (2024-01-02)\n"},
+    {'w', "/proc/version", {"system_version"}, "Linux version 6.1 #1 SMP (2024-01-02)\n"},
     {'x', "/proc/sys/kernel/version", {"system_version"}, "#1 SMP Debian 6.1.1-1 (2024-01-02)\n"},
     {'y', "/proc/sys/kernel/osrelease", {"system_version", "system_boot"}, "6.1.0\n"},
     {'z', "/sys/class/rtc/rtc0/date", {"hardware_chipset"}, "2024-01-02\n"},

@@ -1,7 +1,5 @@
 // Every tool where little is to be had: a full disk or nothing at all behind its streams, few
 // descriptors, another user's processes, an empty host, processes that come and go.
-#include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -83,41 +81,15 @@ TEST_F(SurroundingsTest, UnprivilegedUser) {
   OnThisMachine("", nobody);
 }
 
-// Processes that begin, have threads' worth of children and end, as fast as they can, for as long
-// as it lives.
-class ForkStorm {
- public:
-  ForkStorm() : leader_(fork()) {
-    if (leader_ != 0) return;
-    setpgid(0, 0);
-    signal(SIGCHLD, SIG_DFL);
-    for (;;) {
-      const pid_t child = fork();
-      if (child == 0) {
-        if (fork() == 0) usleep(300);
-        _exit(0);
-      }
-      usleep(100);
-      while (waitpid(-1, nullptr, WNOHANG) > 0) {
-      }
-    }
-  }
-  ~ForkStorm() {
-    kill(-leader_, SIGKILL);
-    kill(leader_, SIGKILL);
-    waitpid(leader_, nullptr, 0);
-  }
-
- private:
-  pid_t leader_;
-};
-
 TEST_F(SurroundingsTest, ProcessesThatComeAndGo) {
-  const ForkStorm storm;
+  // Until the tool has ended, processes begin, have children and end, as fast as they can.
+  const std::string storm =
+      "while :; do (: & : & exec sleep 0.0003) & (: & :); done >/dev/null 2>&1 & storm=$!; "
+      "\"$@\"; status=$?; kill $storm; exit $status; ";
   const std::set<std::string> lookers = {"ps", "pidof", "pgrep", "lsof", "mdf"};
   for (int round = 0; round < (IsLong() ? 40 : 1); ++round) {
     for (const Command &command : kCommands) {
-      if (lookers.contains(command.Tool())) Prepared("", command, "linux");
+      if (lookers.contains(command.Tool())) Prepared(storm, command, "linux");
     }
   }
 }
