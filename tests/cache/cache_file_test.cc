@@ -1,7 +1,4 @@
-// Cache files that are none, damaged, or of another version.
-#include <sys/stat.h>
-#include <unistd.h>
-
+// Cache files that are damaged.
 #include <set>
 
 #include <gmock/gmock.h>
@@ -30,19 +27,6 @@ class CacheFiles : public HostTest {
   }
 };
 
-TEST_F(CacheFiles, ThatAreNoneSayWhy) {
-  const std::string good = Record(kHost);
-  const std::string fifo = Scratch() + "/fifo";
-  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
-  for (const std::string &path : {Scratch() + "/none", good + "/below", std::string()}) {
-    EXPECT_EQ(StatusOf(path), KIF_STATUS_NO_CACHE_FILE) << path;
-  }
-  for (const std::string &path : {Scratch(), fifo, std::string("/dev/zero"), Write("root:x:0:0")}) {
-    EXPECT_EQ(StatusOf(path), KIF_STATUS_NOT_A_CACHE_FILE) << path;
-  }
-  EXPECT_EQ(StatusOf(Write(ReadFile(good) + '\0')), KIF_STATUS_DAMAGED_CACHE_FILE);
-}
-
 TEST_F(CacheFiles, AreRefusedAtEveryShorterLength) {
   const std::string bytes = ReadFile(Record(kHost));
   EXPECT_EQ(StatusOf(Write(bytes)), KIF_STATUS_OK);
@@ -51,30 +35,6 @@ TEST_F(CacheFiles, AreRefusedAtEveryShorterLength) {
         length < 8 ? KIF_STATUS_NOT_A_CACHE_FILE : KIF_STATUS_DAMAGED_CACHE_FILE;
     ASSERT_EQ(StatusOf(Write(bytes.substr(0, length))), expected) << length;
   }
-}
-
-// A file of the given version, otherwise whole.
-std::string WithVersion(uint16_t majorVersion, uint16_t minorVersion, const CacheFile &file) {
-  flatbuffers::FlatBufferBuilder builder;
-  const auto *content = file.header->content();
-  builder.ForceVectorAlignment(content->size(), 1, 8);
-  const auto contentAt = builder.CreateVector(content->data(), content->size());
-  cache::FinishFileBuffer(builder, cache::CreateFile(builder, majorVersion, minorVersion,
-                                                     file.header->checksum(), contentAt));
-  return {reinterpret_cast<const char *>(builder.GetBufferPointer()), builder.GetSize()};
-}
-
-TEST_F(CacheFiles, OfANewerMinorVersionAreReadAndOfAnotherMajorOneAreNot) {
-  CacheFile file;
-  ASSERT_EQ(OpenCacheFile(Record(kHost).c_str(), &file), KIF_STATUS_OK);
-  const std::string newer = WithVersion(kCacheMajorVersion, 77, file);
-  const std::string other = WithVersion(kCacheMajorVersion + 1, 0, file);
-  CloseCacheFile(&file);
-  const Outcome check = Run({BIN_DIR "/kifcache", "check", Write(newer)});
-  EXPECT_EQ(check.status, 0) << check.err;
-  EXPECT_NE(check.out.find(".77\nhost       alpha\n"), check.out.npos) << check.out;
-  // Nothing behind the version matters then.
-  EXPECT_EQ(StatusOf(Write(other.substr(0, other.size() - 1))), KIF_STATUS_CACHE_VERSION);
 }
 
 // The checksum that a content has behind it: what is changed is not for want of the right one.
