@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "cache_bounds.h"
+#include "records/platform.h"
 
 namespace {
 
@@ -111,6 +112,15 @@ class Walk {
   uint64_t fullSize_ = 0;  // of all records
 };
 
+// No reader follows a record that names more processors than there are.
+bool IsCredible(const char *path, std::string_view record) {
+  const NodeInfo *known = FindNodeByPath(path, strlen(path));
+  if (known == nullptr || IndexOf(*known) != kNode_hardware_cpu_cpuInfo) return true;
+  CpuInfo cpus = {};
+  memcpy(&cpus, record.data(), std::min(record.size(), sizeof(cpus)));
+  return cpus.numPcpus <= kMostCpus;
+}
+
 // A file may show the same bytes any number of times; what no writer accepts is damaged.
 bool Walk::Spend(uint64_t size) {
   spent_ += size;
@@ -159,6 +169,7 @@ bool Walk::Show(const VisitedNode &node, const cache::Record &record) {
   if (node.description != nullptr && record.length() > node.description->recordSize) return false;
   std::string_view bytes;
   if (!Decode(record.place(), record.length(), &bytes)) return false;
+  if (!IsCredible(node.path, bytes)) return false;
   visitor_->OnRecord(node, selector_, record.status(), bytes);
   return true;
 }

@@ -41,15 +41,21 @@ class SignatureCounter {
   Array<Entry> entries_;
 };
 
-// A file to be written, or none.
+// A file to be written, or none. One that is not finished is removed: a truncated table looks like a
+// table.
 class OutputFile {
  public:
   OutputFile() = default;
-  ~OutputFile() { Close(); }
+  ~OutputFile() {
+    if (descriptor_ < 0) return;
+    close(descriptor_);
+    unlink(name_);
+  }
   OutputFile(const OutputFile &) = delete;
   OutputFile &operator=(const OutputFile &) = delete;
 
   bool Create(const char *name) {
+    snprintf(name_, sizeof(name_), "%s", name);
     descriptor_ = open(name, O_WRONLY | O_CREAT | O_EXCL | O_TRUNC | O_CLOEXEC, 0600);
     return descriptor_ >= 0;
   }
@@ -59,14 +65,16 @@ class OutputFile {
   }
 
   // False when the system could not keep what was written.
-  bool Close() {
+  bool Finish() {
     const bool closed = descriptor_ < 0 || close(descriptor_) == 0;
+    if (!closed) unlink(name_);
     descriptor_ = -1;
     return closed;
   }
 
  private:
   int descriptor_ = -1;
+  char name_[32];
 };
 
 bool FailWithErrno() {
@@ -119,7 +127,7 @@ bool DumpTable(int32_t value, KIF_ParamList *selector, SignatureCounter *counter
   for (int32_t number = 0; number < count; ++number) {
     if (!DumpBuffer(selector, number, counter, &file)) return false;
   }
-  if (!file.Close()) return FailWithErrno();
+  if (!file.Finish()) return FailWithErrno();
   KIF_ParamListRemoveLastParam(selector);
   return true;
 }
