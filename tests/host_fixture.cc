@@ -9,6 +9,7 @@
 #include <filesystem>
 #include <fstream>
 #include <future>
+#include <set>
 #include <sstream>
 
 namespace {
@@ -37,6 +38,11 @@ std::vector<std::string> Environment(const std::vector<std::string> &added) {
   environment.insert(environment.end(),
                      {"PATH=/usr/sbin:/usr/bin:/sbin:/bin", "TZ=UTC", "BIN_DIR=" BIN_DIR,
                       "LIB_DIR=" LIB_DIR, "ASAN_OPTIONS=detect_leaks=1"});
+  // A shell would take the last.
+  std::set<std::string> names;
+  std::erase_if(environment, [&names](const std::string &variable) {
+    return !names.insert(variable.substr(0, variable.find('='))).second;
+  });
   return environment;
 }
 
