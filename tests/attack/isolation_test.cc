@@ -114,19 +114,4 @@ TEST_F(Isolation, ARecorderThatIsKilledLeavesTheOldFile) {
   printf("%d kills, %d recordings were whole before\n", kills, whole);
 }
 
-TEST_F(Isolation, ARecorderOnAFullDiskLeavesTheOldFile) {
-  const std::string file = Scratch() + "/saved.kif";
-  for (const char *old : {"the old file", ""}) {
-    std::filesystem::remove(file);
-    if (*old != '\0') WriteFile("saved.kif", old);
-    const Outcome limited =
-        Run({"sh", "-c", "ulimit -f 1; exec \"$@\"", "sh", BIN_DIR "/kifcache", "record", file},
-            {.environment = {"ZELLIBS_HOST=" + host_}});
-    EXPECT_EQ(limited.status, 1);
-    EXPECT_EQ(limited.err, "kifcache: " + file + ": File too large\n");
-    EXPECT_EQ(ReadFile(file), old);
-    EXPECT_EQ(Recordings().size(), *old != '\0' ? 1u : 0u);
-  }
-}
-
 }  // namespace

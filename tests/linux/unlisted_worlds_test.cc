@@ -8,14 +8,10 @@
 
 namespace {
 
-template <typename Symbol>
-Symbol *Find(const char *name) {
-  static void *library = dlopen(LIB_DIR "/libzellibs.so", RTLD_NOW);
-  return reinterpret_cast<Symbol *>(dlsym(library, name));
-}
-#define KIF(name) (*Find<decltype(name)>(#name))
+void *const library = dlopen(LIB_DIR "/libzellibs.so", RTLD_NOW);
+#define KIF(name) (*reinterpret_cast<decltype(&name)>(dlsym(library, #name)))
 
-class UnlistedWorlds : public HostTest {};
+using UnlistedWorlds = HostTest;
 
 TEST_F(UnlistedWorlds, AreFoundOrNot) {
   const std::string rest = " S 0 1 1 0 -1 0 0 0 0 0 1 2 0 0 20 0 2 0 9 0 0\n";
