@@ -21,8 +21,6 @@ expect() {
 }
 recorded() { expect "$1" zlkkiftools -c host.kif "${@:2}"; }
 recorded 'Mass storage controller: Red Hat, Inc. Virtio block device [vda]' lspci
-recorded '1     1   init' ps
-recorded 'Options : console=' bootOption -o
 recorded 'load average: ' uptime
 ZELLIBS_HOST=$PWD/host.kif expect '/mnt/ram/gone:            5' zlkkiftools mdu -u
 
