@@ -124,7 +124,7 @@ ONE(const char *, KIF_ParamGetString, nullptr, KIF_Param *)
 
 // dlsym() allocates, so the allocator is reached by its other names. With the address sanitizer it
 // is the sanitizer's.
-#if defined(__SANITIZE_ADDRESS__)
+#if defined(UNDER_ADDRESS_SANITIZER)
 #define ALLOCATOR(name) __interceptor_##name
 #else
 #define ALLOCATOR(name) __libc_##name
