@@ -16,7 +16,9 @@ std::string folder = "/dev/shm/zlkkiftools-fuzz.XXXXXX";
 // Makes the folder, which is removed at the end; without it there is nothing to be done.
 [[maybe_unused]] void MakeFolder() {
   if (mkdtemp(folder.data()) == nullptr) abort();
+  static const pid_t owner = getpid();
   atexit([] {
+    if (getpid() != owner) return;
     std::error_code ignored;
     std::filesystem::remove_all(folder, ignored);
   });

@@ -1,0 +1,95 @@
+// Any bytes as a cache file that the tools themselves walk, each run in a process of its own under
+// limits of memory, time and output that grow with the file: what asks for more is a fault, as is a
+// signal. The command lines take turns.
+#include <signal.h>
+#include <sys/resource.h>
+#include <sys/time.h>
+#include <sys/wait.h>
+
+#include "cache_file.h"
+#include "read_host.h"
+#include "surroundings.h"
+#include "zellibs.h"
+
+int ProgramMain(int argc, char **argv);  // of the program, under another name
+
+namespace {
+
+constexpr rlim_t kMiB = 1 << 20;
+
+const char *const kRuns[][3] = {
+    {"ps", "-cgPTstvZUiz"}, {"ps", "-Jcz"},         {"lspci", "-vde"},     {"lspci", "-p"},
+    {"lsof"},               {"irqinfo"},            {"amldump"},           {"mdf", "-h"},
+    {"pidof", "sh"},        {"pgrep", "-lf", "."},  {"bootOption", "-ro"}, {"userspaceof", "1"},
+    {"zelvar", "-v"},       {"mdu", "-u"},          {"uptime"},            {"hwclock"},
+};
+size_t turn;
+
+void Limit(int resource, rlim_t most) {
+  const rlimit limit = {most, most};
+  setrlimit(resource, &limit);
+}
+
+rlim_t AddressSpace() {
+  FILE *file = fopen("/proc/self/statm", "r");
+  unsigned long pages = 0;
+  if (file == nullptr || fscanf(file, "%lu", &pages) != 1) abort();
+  fclose(file);
+  return rlim_t{pages} * 4096;
+}
+
+[[noreturn]] void Run(const char *const (&run)[3], size_t size) {
+  const int out = open((folder + "/out").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+  const int nowhere = open("/dev/null", O_WRONLY);
+  if (out < 0 || chdir(folder.c_str()) != 0) _exit(0);
+  dup2(out, STDOUT_FILENO);
+  dup2(nowhere, STDERR_FILENO);
+  Limit(RLIMIT_CORE, 0);
+  Limit(RLIMIT_AS, AddressSpace() + 64 * kMiB + 200 * size);
+  Limit(RLIMIT_FSIZE, 64 * kMiB + 200 * size);
+  itimerval timer = {};
+  timer.it_value.tv_sec = static_cast<time_t>(2 + size / 10000);
+  setitimer(ITIMER_PROF, &timer, nullptr);
+  signal(SIGPIPE, SIG_IGN);
+  for (const int number : {SIGPROF, SIGXFSZ, SIGSEGV, SIGBUS, SIGABRT}) {
+    struct sigaction action = {};
+    action.sa_handler = SIG_DFL;
+    sigaction(number, &action, nullptr);
+  }
+  std::string words[] = {"zlkkiftools", "-c", "host.kif", run[0], "", ""};
+  char *arguments[7] = {};
+  int count = 4;
+  for (int i = 1; i < 3 && run[i] != nullptr; ++i) words[count++] = run[i];
+  for (int i = 0; i < count; ++i) arguments[i] = words[i].data();
+  const int status = ProgramMain(count, arguments);
+  fflush(stdout);
+  _exit(status & 0x3f);
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerInitialize(int *, char ***) {
+  MakeFolder();
+  setenv("ZELLIBS_HOST", "none", 1);
+  return 0;
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
+  Write("/host.kif", data, size);
+  if (KIF_UseCache((folder + "/host.kif").c_str(), 0) != 0) return 0;
+  ReadHost(nullptr);  // shows the fuzzer the way; what a child does it does not see
+  const auto &run = kRuns[turn++ % std::size(kRuns)];
+  const pid_t child = fork();
+  if (child == 0) Run(run, size);
+  int status = 0;
+  if (child < 0 || waitpid(child, &status, 0) != child) return 0;
+  if (WIFSIGNALED(status)) {
+    fprintf(stderr, "%s: ended by signal %d\n", run[0], WTERMSIG(status));
+    abort();
+  }
+  std::error_code ignored;
+  for (const auto &entry : std::filesystem::directory_iterator(folder)) {
+    if (entry.path().filename() != "host.kif") std::filesystem::remove(entry.path(), ignored);
+  }
+  return 0;
+}
