@@ -23,8 +23,8 @@
 namespace {
 
 // Whether `address` lies in the program's own code. Waits for no lock of the loader, which may be
-// at work.
-bool IsInProgram(const void *address) {
+// at work, and is asked before the sanitizer has begun.
+[[gnu::no_sanitize_address]] bool IsInProgram(const void *address) {
   dl_find_object object;
   return _dl_find_object(const_cast<void *>(address), &object) == 0 &&
          object.dlfo_link_map->l_name[0] == '\0';
