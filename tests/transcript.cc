@@ -185,21 +185,19 @@ class CaseTest : public HostTest {
 };
 
 void CaseTest::WriteHost() {
-  Lines text, tree, keys;
+  Lines text, tree;
   for (const std::string &line : case_.host) {
-    if (line[0] == '/' || line[0] == ' ') {
-      tree.push_back(line);
-      continue;
-    }
     // A later answer for the same place takes the place of the one before.
-    const std::string key = line.substr(0, line.find(" ="));
-    const auto before = std::find(keys.begin(), keys.end(), key);
-    if (before != keys.end()) {
-      text[static_cast<size_t>(before - keys.begin())] = line;
-      continue;
+    const std::string key = line.substr(0, line.find(" =")) + " =";
+    const bool isTree = line[0] == '/' || line[0] == ' ';
+    const auto before = std::find_if(text.begin(), text.end(), [&key](const std::string &other) {
+      return (other + " =").starts_with(key);
+    });
+    if (!isTree && before != text.end()) {
+      *before = line;
+    } else {
+      (isTree ? tree : text).push_back(line);
     }
-    keys.push_back(key);
-    text.push_back(line);
   }
   if (!tree.empty()) WriteTree(tree);
   if (text.empty()) return;
