@@ -117,7 +117,7 @@ bool IsCredible(const char *path, std::string_view record) {
   const NodeInfo *known = FindNodeByPath(path, strlen(path));
   if (known == nullptr || IndexOf(*known) != kNode_hardware_cpu_cpuInfo) return true;
   CpuInfo cpus = {};
-  memcpy(&cpus, record.data(), std::min(record.size(), sizeof(cpus)));
+  record.copy(reinterpret_cast<char *>(&cpus), sizeof(cpus));
   return cpus.numPcpus <= kMostCpus;
 }
 
