@@ -2,6 +2,8 @@
 
 #include <cstring>
 
+#include "cache_answers.h"
+
 namespace {
 
 constexpr uint64_t kMiB = 1 << 20;
@@ -9,13 +11,12 @@ constexpr uint64_t kMiB = 1 << 20;
 // A file of N bytes has at most so many answers, however its nodes share them.
 bool CountAnswers(const CacheFile &file, uint64_t *answers) {
   uint64_t bytes = 0;
-  for (const cache::Node *node : *file.content->nodes()) {
-    const uint64_t lists = node->lists() != nullptr ? node->lists()->size() : 0;
-    const uint64_t records = node->records() != nullptr ? node->records()->size() : 0;
-    const uint64_t contents = node->contents() != nullptr ? node->contents()->size() : 0;
-    *answers += lists + records + contents;
-    bytes += lists * sizeof(cache::List) + records * sizeof(cache::Record) +
-             contents * sizeof(cache::Stored);
+  NodeAnswers of;
+  for (uint32_t i = 0; AnswersAt(file, i, &of); ++i) {
+    *answers += uint64_t{of.lists.count} + of.records.count + of.contents.count;
+    bytes += of.lists.count * uint64_t{sizeof(cache::List)} +
+             of.records.count * uint64_t{sizeof(cache::Record)} +
+             of.contents.count * uint64_t{sizeof(cache::Stored)};
   }
   return bytes <= file.size;
 }
@@ -38,15 +39,14 @@ bool Spend(const CacheFile &file, const cache::List &list, uint64_t *entries, ui
 
 bool ListsAreWithinBounds(const CacheFile &file) {
   constexpr uint64_t kMoreEntries = 1000;
-  if (file.content->nodes() == nullptr) return true;
   uint64_t answers = 0;
   if (!CountAnswers(file, &answers)) return false;
   uint64_t entries = answers + file.parameterCount + kMoreEntries;
   uint64_t text = 16 * kMiB + uint64_t{16} * file.size;
-  for (const cache::Node *node : *file.content->nodes()) {
-    if (node->lists() == nullptr) continue;
-    for (const cache::List *list : *node->lists()) {
-      if (!Spend(file, *list, &entries, &text)) return false;
+  NodeAnswers of;
+  for (uint32_t i = 0; AnswersAt(file, i, &of); ++i) {
+    for (uint32_t k = 0; k < of.lists.count; ++k) {
+      if (!Spend(file, CopyOf(of.lists.first + k), &entries, &text)) return false;
     }
   }
   return true;

@@ -32,6 +32,7 @@ bool VerifyContent(CacheFile *file) {
   const auto *bytes = file->header->content();
   flatbuffers::Verifier verifier(bytes->data(), bytes->size());
   if (!verifier.VerifyBuffer<cache::Content>()) return false;
+  file->contentStart = bytes->data();
   file->content = flatbuffers::GetRoot<cache::Content>(bytes->data());
   const auto *parameters = file->content->parameters();
   if (parameters != nullptr && parameters->size() > 0) {  // an empty vector is not aligned

@@ -20,6 +20,7 @@ struct CacheFile {
   const uint8_t *map;
   size_t size;
   const cache::File *header;
+  const uint8_t *contentStart;
   const cache::Content *content;
   const cache::Parameter *parameters;
   uint32_t parameterCount;

@@ -1,8 +1,10 @@
 // The recorded host: the answers of a cache file.
 #include <algorithm>
+#include <cstdlib>
 #include <cstring>
 
 #include "base/array.h"
+#include "cache_answers.h"
 #include "cache_bounds.h"
 #include "cache_file.h"
 #include "host.h"
@@ -21,7 +23,7 @@ Bounds bounds;
 // The answers of a node, looked up in the file when the node is first asked for.
 struct Answers {
   bool lookedUp;
-  const cache::Node *node;  // null where the file has nothing of it
+  NodeAnswers all;
   // A tool that walks a list reads the records in their order: where the last look-up ended, the
   // next one is tried first.
   uint32_t recordHint;
@@ -33,12 +35,10 @@ Answers answersByNode[kNodeCount];
 Answers *AnswersOf(const NodeInfo &node) {
   Answers *answers = &answersByNode[IndexOf(node)];
   if (!answers->lookedUp) {
-    const auto *nodes = recording.content->nodes();
-    answers->node = nodes != nullptr ? nodes->LookupByKey(node.path) : nullptr;
+    (void)FindAnswers(recording, node.path, &answers->all);
     answers->lookedUp = true;
-    const auto *records = answers->node != nullptr ? answers->node->records() : nullptr;
-    answers->tooManyRecords = records != nullptr && !RecordsAreWithinBounds(
-                                                        recording, records->size(), node.recordSize);
+    answers->tooManyRecords =
+        !RecordsAreWithinBounds(recording, answers->all.records.count, node.recordSize);
   }
   return answers;
 }
@@ -56,7 +56,11 @@ bool Compare(const cache::Parameter &recorded, const Param &given, int *order) {
   } else if (kind == cache::Kind::Text) {
     const char *text = ParameterText(recording, recorded);
     if (text == nullptr) return false;
-    *order = strcmp(text, given.text);
+    // The zero byte behind it may have gone since.
+    const size_t length = recorded.length();
+    const size_t givenLength = strlen(given.text);
+    *order = memcmp(text, given.text, length < givenLength ? length : givenLength);
+    if (*order == 0 && length != givenLength) *order = length < givenLength ? -1 : 1;
   } else {
     *order = 0;
   }
@@ -69,7 +73,7 @@ bool Compare(const cache::Selector &selector, const KIF_ParamList *given, int *o
   const uint32_t count = CountOf(given);
   *order = 0;
   for (uint32_t i = 0; *order == 0 && i < selector.count() && i < count; ++i) {
-    if (!Compare(recorded[i], given->params[i], order)) return false;
+    if (!Compare(CopyOf(recorded + i), given->params[i], order)) return false;
   }
   if (*order == 0 && selector.count() != count) *order = selector.count() < count ? -1 : 1;
   return true;
@@ -78,16 +82,15 @@ bool Compare(const cache::Selector &selector, const KIF_ParamList *given, int *o
 // Finds the answer for `given` in `answers` (null: there are none). `*hint` is the place to try
 // first, and then the place after the answer.
 template <typename Answer>
-KIF_Status Find(const flatbuffers::Vector<const Answer *> *answers, const KIF_ParamList *given,
-                uint32_t *hint, const Answer **found) {
-  if (answers == nullptr) return KIF_STATUS_NOT_FOUND;
+KIF_Status Find(const Answered<Answer> &answers, const KIF_ParamList *given, uint32_t *hint,
+                Answer *found) {
   uint32_t low = 0;
-  uint32_t high = answers->size();
+  uint32_t high = answers.count;
   uint32_t middle = *hint < high ? *hint : high / 2;
   while (low < high) {
-    const Answer *answer = answers->Get(middle);
+    const Answer answer = CopyOf(answers.first + middle);
     int order;
-    if (!Compare(answer->selector(), given, &order)) return KIF_STATUS_DAMAGED_CACHE_FILE;
+    if (!Compare(answer.selector(), given, &order)) return KIF_STATUS_DAMAGED_CACHE_FILE;
     if (order == 0) {
       *hint = middle + 1;
       *found = answer;
@@ -107,14 +110,11 @@ KIF_Status Find(const flatbuffers::Vector<const Answer *> *answers, const KIF_Pa
 // The table of interrupts has a cell for each of them and each processor.
 bool FitsInterrupts(uint32_t cpus) {
   constexpr uint64_t kMostEmptyCells = 1000000;
-  const cache::Node *list = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList])->node;
-  const cache::Node *cells = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList_PCPU])->node;
+  const auto &lists = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList])->all.lists;
+  const auto &cells = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList_PCPU])->all.records;
   uint64_t interrupts = 0;
-  if (list != nullptr && list->lists() != nullptr) {
-    for (const cache::List *all : *list->lists()) interrupts += all->count();
-  }
-  const auto *counts = cells != nullptr ? cells->records() : nullptr;
-  return interrupts * cpus <= kMostEmptyCells + 16 * uint64_t{counts != nullptr ? counts->size() : 0};
+  for (uint32_t i = 0; i < lists.count; ++i) interrupts += CopyOf(lists.first + i).count();
+  return interrupts * cpus <= kMostEmptyCells + 16 * uint64_t{cells.count};
 }
 
 // Whether a record that says how many processors there are can be followed.
@@ -128,20 +128,28 @@ bool IsCredible(const NodeInfo &node, const void *record) {
 
 KIF_Status GetRecord(const NodeInfo &node, const KIF_ParamList *instance, void *record) {
   Answers *answers = AnswersOf(node);
-  if (answers->node == nullptr) return KIF_STATUS_NOT_FOUND;
   if (answers->tooManyRecords) return KIF_STATUS_DAMAGED_CACHE_FILE;
-  const cache::Record *answer;
-  const KIF_Status status = Find(answers->node->records(), instance, &answers->recordHint, &answer);
+  cache::Record answer;
+  const KIF_Status status = Find(answers->all.records, instance, &answers->recordHint, &answer);
   if (status != KIF_STATUS_OK) return status;
-  if (answer->status() != KIF_STATUS_OK) return answer->status();
+  if (answer.status() != KIF_STATUS_OK) return answer.status();
   // Beyond the tools a record may have grown since.
-  uint32_t length = answer->length();
+  uint32_t length = answer.length();
   if (length > node.recordSize && !node.hasVariable) length = node.recordSize;
-  if (length > node.recordSize || !HasBytes(recording, answer->place(), answer->length())) {
+  if (length > node.recordSize || !HasBytes(recording, answer.place(), answer.length())) {
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
-  if (length > 0) memcpy(record, recording.bytes + answer->place(), length);
+  if (length > 0) memcpy(record, recording.bytes + answer.place(), length);
   return IsCredible(node, record) ? KIF_STATUS_OK : KIF_STATUS_DAMAGED_CACHE_FILE;
+}
+
+// The zero byte behind it may have gone since.
+KIF_Status AddCopy(KIF_ParamList *list, const char *text, size_t length) {
+  char *copy = strndup(text, length);
+  if (copy == nullptr) return KIF_STATUS_NO_MEMORY;
+  const KIF_Status status = KIF_ParamListAddString(list, copy);
+  free(copy);
+  return status;
 }
 
 KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list) {
@@ -152,7 +160,8 @@ KIF_Status Append(const cache::Parameter &entry, KIF_ParamList *list) {
       return KIF_ParamListAddString(list, nullptr);
     case cache::Kind::Text: {
       const char *text = ParameterText(recording, entry);
-      return text != nullptr ? KIF_ParamListAddString(list, text) : KIF_STATUS_DAMAGED_CACHE_FILE;
+      if (text == nullptr) return KIF_STATUS_DAMAGED_CACHE_FILE;
+      return AddCopy(list, text, entry.length());
     }
   }
   return KIF_STATUS_DAMAGED_CACHE_FILE;
@@ -185,54 +194,51 @@ KIF_Status CheckEntriesStandOnce(const NodeInfo &node, const KIF_ParamList &list
 
 KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_ParamList *list) {
   Answers *answers = AnswersOf(node);
-  if (answers->node == nullptr) return KIF_STATUS_NOT_FOUND;
-  const cache::List *answer;
-  KIF_Status status = Find(answers->node->lists(), parent, &answers->listHint, &answer);
+  cache::List answer;
+  KIF_Status status = Find(answers->all.lists, parent, &answers->listHint, &answer);
   if (status != KIF_STATUS_OK) return status;
-  if (answer->status() != KIF_STATUS_OK) return answer->status();
+  if (answer.status() != KIF_STATUS_OK) return answer.status();
   if (bounds == Bounds::kUnknown) {
     bounds = ListsAreWithinBounds(recording) ? Bounds::kKept : Bounds::kBroken;
   }
-  if (bounds == Bounds::kBroken || !HasParameters(recording, answer->first(), answer->count())) {
+  if (bounds == Bounds::kBroken || !HasParameters(recording, answer.first(), answer.count())) {
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
-  if (!ReserveParams(list, answer->count())) return KIF_STATUS_NO_MEMORY;
-  for (uint32_t i = 0; status == KIF_STATUS_OK && i < answer->count(); ++i) {
-    status = Append(recording.parameters[answer->first() + i], list);
+  if (!ReserveParams(list, answer.count())) return KIF_STATUS_NO_MEMORY;
+  for (uint32_t i = 0; status == KIF_STATUS_OK && i < answer.count(); ++i) {
+    status = Append(CopyOf(recording.parameters + answer.first() + i), list);
   }
   return status == KIF_STATUS_OK ? CheckEntriesStandOnce(node, *list) : status;
 }
 
 KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance,
-                       const cache::Stored **answer) {
-  const cache::Node *recorded = AnswersOf(node)->node;
-  if (recorded == nullptr) return KIF_STATUS_NOT_FOUND;
+                       cache::Stored *answer) {
   uint32_t hint = 0;
-  const KIF_Status status = Find(recorded->contents(), instance, &hint, answer);
-  if (status == KIF_STATUS_OK && !HasBytes(recording, (*answer)->place(), (*answer)->length())) {
+  const KIF_Status status = Find(AnswersOf(node)->all.contents, instance, &hint, answer);
+  if (status == KIF_STATUS_OK && !HasBytes(recording, answer->place(), answer->length())) {
     return KIF_STATUS_DAMAGED_CACHE_FILE;
   }
   return status;
 }
 
 KIF_Status GetContentLength(const NodeInfo &node, const KIF_ParamList *instance, uint32_t *length) {
-  const cache::Stored *answer;
+  cache::Stored answer;
   const KIF_Status status = FindContent(node, instance, &answer);
   if (status != KIF_STATUS_OK) return status;
-  if (answer->length_status() != KIF_STATUS_OK) return answer->length_status();
-  *length = answer->total();
+  if (answer.length_status() != KIF_STATUS_OK) return answer.length_status();
+  *length = answer.total();
   return KIF_STATUS_OK;
 }
 
 KIF_Status GetContent(const NodeInfo &node, const KIF_ParamList *instance, uint32_t offset,
                       uint32_t wanted, void *bytes, uint32_t *given) {
-  const cache::Stored *answer;
+  cache::Stored answer;
   const KIF_Status status = FindContent(node, instance, &answer);
   if (status != KIF_STATUS_OK) return status;
-  if (answer->read_status() != KIF_STATUS_OK) return answer->read_status();
-  const uint32_t rest = offset < answer->length() ? answer->length() - offset : 0;
+  if (answer.read_status() != KIF_STATUS_OK) return answer.read_status();
+  const uint32_t rest = offset < answer.length() ? answer.length() - offset : 0;
   *given = wanted < rest ? wanted : rest;
-  if (*given > 0) memcpy(bytes, recording.bytes + answer->place() + offset, *given);
+  if (*given > 0) memcpy(bytes, recording.bytes + answer.place() + offset, *given);
   return KIF_STATUS_OK;
 }
 
@@ -240,8 +246,7 @@ KIF_Status GetContent(const NodeInfo &node, const KIF_ParamList *instance, uint3
 KIF_Status Set(const NodeInfo &node, const KIF_ParamList *instance, const KIF_ParamList *input) {
   (void)instance;
   (void)input;
-  const cache::Node *recorded = AnswersOf(node)->node;
-  return recorded != nullptr ? recorded->set_status() : KIF_STATUS_OK;
+  return AnswersOf(node)->all.setStatus;
 }
 
 KIF_Status CheckSignature(char *date, bool *matches) {
