@@ -59,7 +59,7 @@ void Find(const CacheFile &file, uint64_t node, uint32_t field, Answered<Answer>
   uint32_t count;
   *answers = {};
   if (!FindVector(file, node, field, sizeof(Answer), &first, &count)) return;
-  *answers = {reinterpret_cast<const Answer *>(file.map + first), count};
+  *answers = {file.map + first, count};
 }
 
 // How the path of a node compares with `path`.

@@ -8,18 +8,20 @@
 
 // A copy of a struct of the mapped file. The compiler may not look at the file again.
 template <typename Struct>
-Struct CopyOf(const Struct *place) {
+Struct CopyOf(const void *place) {
   Struct copy;
   memcpy(&copy, place, sizeof(copy));
   asm volatile("" : : "r"(&copy) : "memory");
   return copy;
 }
 
-// Answers of one kind: `count` structs that lie within the file.
+// Answers of one kind: `count` structs that lie within the file, aligned or not.
 template <typename Answer>
 struct Answered {
-  const Answer *first;
+  const uint8_t *first;
   uint32_t count;
+
+  Answer At(uint32_t place) const { return CopyOf<Answer>(first + place * sizeof(Answer)); }
 };
 
 struct NodeAnswers {

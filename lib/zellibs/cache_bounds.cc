@@ -46,7 +46,7 @@ bool ListsAreWithinBounds(const CacheFile &file) {
   NodeAnswers of;
   for (uint32_t i = 0; AnswersAt(file, i, &of); ++i) {
     for (uint32_t k = 0; k < of.lists.count; ++k) {
-      if (!Spend(file, CopyOf(of.lists.first + k), &entries, &text)) return false;
+      if (!Spend(file, of.lists.At(k), &entries, &text)) return false;
     }
   }
   return true;

@@ -73,7 +73,7 @@ bool Compare(const cache::Selector &selector, const KIF_ParamList *given, int *o
   const uint32_t count = CountOf(given);
   *order = 0;
   for (uint32_t i = 0; *order == 0 && i < selector.count() && i < count; ++i) {
-    if (!Compare(CopyOf(recorded + i), given->params[i], order)) return false;
+    if (!Compare(CopyOf<cache::Parameter>(recorded + i), given->params[i], order)) return false;
   }
   if (*order == 0 && selector.count() != count) *order = selector.count() < count ? -1 : 1;
   return true;
@@ -88,7 +88,7 @@ KIF_Status Find(const Answered<Answer> &answers, const KIF_ParamList *given, uin
   uint32_t high = answers.count;
   uint32_t middle = *hint < high ? *hint : high / 2;
   while (low < high) {
-    const Answer answer = CopyOf(answers.first + middle);
+    const Answer answer = answers.At(middle);
     int order;
     if (!Compare(answer.selector(), given, &order)) return KIF_STATUS_DAMAGED_CACHE_FILE;
     if (order == 0) {
@@ -113,7 +113,7 @@ bool FitsInterrupts(uint32_t cpus) {
   const auto &lists = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList])->all.lists;
   const auto &cells = AnswersOf(kNodes[kNode_hardware_interrupts_cookieList_PCPU])->all.records;
   uint64_t interrupts = 0;
-  for (uint32_t i = 0; i < lists.count; ++i) interrupts += CopyOf(lists.first + i).count();
+  for (uint32_t i = 0; i < lists.count; ++i) interrupts += lists.At(i).count();
   return interrupts * cpus <= kMostEmptyCells + 16 * uint64_t{cells.count};
 }
 
@@ -206,7 +206,7 @@ KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_P
   }
   if (!ReserveParams(list, answer.count())) return KIF_STATUS_NO_MEMORY;
   for (uint32_t i = 0; status == KIF_STATUS_OK && i < answer.count(); ++i) {
-    status = Append(CopyOf(recording.parameters + answer.first() + i), list);
+    status = Append(CopyOf<cache::Parameter>(recording.parameters + answer.first() + i), list);
   }
   return status == KIF_STATUS_OK ? CheckEntriesStandOnce(node, *list) : status;
 }
