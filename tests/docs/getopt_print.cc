@@ -22,19 +22,11 @@ namespace {
 
 }  // namespace
 
-extern "C" __attribute__((visibility("default"))) int getopt(int, char *const *,
-                                                             const char *letters) noexcept {
+extern "C" int getopt(int, char *const *, const char *letters) noexcept {
   PrintAndExit(letters, nullptr);
 }
 
-extern "C" __attribute__((visibility("default"))) int getopt_long(int, char *const *,
-                                                                  const char *letters,
-                                                                  const option *longOptions,
-                                                                  int *) noexcept {
+extern "C" int getopt_long(int, char *const *, const char *letters, const option *longOptions,
+                           int *) noexcept {
   PrintAndExit(letters, longOptions);
-}
-
-// No host of a test keeps a tool from its options.
-extern "C" __attribute__((visibility("default"))) bool KIF_HostIsForeign() {
-  return false;
 }

@@ -44,19 +44,17 @@ Report ownReport;
 Report *report = &ownReport;
 bool isInMain;
 
-enum class Kind { kOperation, kAllocation };
-
-bool IsFailing(const char *operation, Kind kind, const void *caller) {
+bool IsFailing(const char *operation, bool isAllocation, const void *caller) {
   const char *failing = getenv("FAIL_OPERATION");
   if (failing == nullptr) return false;
-  if (kind == Kind::kAllocation && strcmp(failing, "allocations") == 0) return isInMain;
+  if (isAllocation && strcmp(failing, "allocations") == 0) return isInMain;
   if (!IsInProgram(caller)) return false;
-  if (kind == Kind::kOperation && strcmp(failing, "operations") == 0) return isInMain;
+  if (!isAllocation && strcmp(failing, "operations") == 0) return isInMain;
   return strcmp(failing, operation) == 0;
 }
 
-bool Fails(const char *operation, Kind kind, const void *caller) {
-  if (!IsFailing(operation, kind, caller)) return false;
+bool Fails(const char *operation, bool isAllocation, const void *caller) {
+  if (!IsFailing(operation, isAllocation, caller)) return false;
   const uint32_t call = ++report->calls;
   const uint32_t first = NumberFrom("FAIL_CALL", 1);
   const bool goesOn = first != 0 && NumberFrom("FAIL_FROM", 0) != 0;
@@ -85,25 +83,24 @@ Operation *Next(const char *name) {
 
 }  // namespace
 
-#define OPERATION(Result, name, failure, parameters, arguments)                     \
-  Result name parameters {                                                          \
-    static auto *next = Next<decltype(name)>(#name);                                \
-    const bool fails = Fails(#name, Kind::kOperation, __builtin_return_address(0)); \
-    return fails ? failure : next arguments;                                        \
+#define OPERATION(Result, name, failure, parameters, arguments)          \
+  Result name parameters {                                               \
+    static auto *next = Next<decltype(name)>(#name);                     \
+    const bool fails = Fails(#name, false, __builtin_return_address(0)); \
+    return fails ? failure : next arguments;                             \
   }
 // The parameters are of the types A to E.
 #define ONE(Result, name, failure, A) OPERATION(Result, name, failure, (A a), (a))
 #define TWO(Result, name, failure, A, B) OPERATION(Result, name, failure, (A a, B b), (a, b))
 #define THREE(Result, name, failure, A, B, C) \
   OPERATION(Result, name, failure, (A a, B b, C c), (a, b, c))
+#define FIVE(name, A, B, C, D, E) \
+  OPERATION(KIF_Status, name, FailStatus(), (A a, B b, C c, D d, E e), (a, b, c, d, e))
 #define FOUR(name, A, B, C, D) \
   OPERATION(KIF_Status, name, FailStatus(), (A a, B b, C c, D d), (a, b, c, d))
 
 FOUR(KIF_Get, uint32_t, KIF_ParamList *, void *, uint32_t)
-OPERATION(KIF_Status, KIF_Set, FailStatus(),
-          (uint32_t node, KIF_ParamList *instance, KIF_ParamList *input, void *output,
-           uint32_t size),
-          (node, instance, input, output, size))
+FIVE(KIF_Set, uint32_t, KIF_ParamList *, KIF_ParamList *, void *, uint32_t)
 FOUR(KIF_SetData, uint32_t, KIF_ParamList *, KIFData *, KIFData *)
 FOUR(KIF_GetInstanceListAllocHint, uint32_t, KIF_ParamList *, uint32_t, KIF_ParamList **)
 THREE(KIF_Status, KIF_GetInstanceListAlloc, FailStatus(), uint32_t, KIF_ParamList *,
@@ -135,23 +132,18 @@ void *ALLOCATOR(malloc)(size_t size);
 void *ALLOCATOR(calloc)(size_t count, size_t size);
 void *ALLOCATOR(realloc)(void *block, size_t size);
 
-#define ALLOCATION(name, parameters, arguments)                          \
-  void *name parameters {                                                \
-    if (!Fails(#name, Kind::kAllocation, __builtin_return_address(0))) { \
-      return ALLOCATOR(name) arguments;                                  \
-    }                                                                    \
-    errno = ENOMEM;                                                      \
-    return nullptr;                                                      \
+#define ALLOCATION(name, parameters, arguments)             \
+  void *name parameters {                                   \
+    if (!Fails(#name, true, __builtin_return_address(0))) { \
+      return ALLOCATOR(name) arguments;                     \
+    }                                                       \
+    errno = ENOMEM;                                         \
+    return nullptr;                                         \
   }
 
 ALLOCATION(malloc, (size_t size) noexcept, (size))
 ALLOCATION(calloc, (size_t count, size_t size) noexcept, (count, size))
 ALLOCATION(realloc, (void *block, size_t size) noexcept, (block, size))
-
-// What fails, fails on the hosts that a test wrote: they pass for this machine.
-bool KIF_HostIsForeign() {
-  return false;
-}
 
 using Main = int(int argc, char **argv, char **environment);
 static Main *programMain;

@@ -25,7 +25,7 @@ const char *Redirected(const char *path, char (&buffer)[PATH_MAX]) {
 
 // Neither asks the loader for the function it stands before, so that a sanitizer may be at work.
 extern "C" {
-__attribute__((visibility("default"))) int open(const char *path, int flags, ...) {
+int open(const char *path, int flags, ...) {
   va_list arguments;
   va_start(arguments, flags);
   const mode_t mode = (flags & (O_CREAT | __O_TMPFILE)) != 0 ? va_arg(arguments, mode_t) : 0;
@@ -34,10 +34,9 @@ __attribute__((visibility("default"))) int open(const char *path, int flags, ...
   return openat(AT_FDCWD, Redirected(path, buffer), flags, mode);
 }
 
-__attribute__((visibility("default"))) int open64(const char *path, int flags, ...)
-    __attribute__((alias("open")));
+int open64(const char *path, int flags, ...) __attribute__((alias("open")));
 
-__attribute__((visibility("default"))) DIR *opendir(const char *path) {
+DIR *opendir(const char *path) {
   char buffer[PATH_MAX];
   const int folder = openat(AT_FDCWD, Redirected(path, buffer), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   DIR *listing = folder >= 0 ? fdopendir(folder) : nullptr;
