@@ -10,7 +10,7 @@
 
 namespace {
 
-FILE *nowhere;
+const std::string path = folder + "/host.kif";
 
 bool Show(const CacheFile &file, Visitor *writer) {
   std::string problem;
@@ -19,16 +19,8 @@ bool Show(const CacheFile &file, Visitor *writer) {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  MakeFolder();
-  nowhere = Silence();
-  setenv("ZELLIBS_HOST", "none", 1);
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   Write("/host.kif", data, size);
-  const std::string path = folder + "/host.kif";
   CacheFile file;
   if (OpenCacheFile(path.c_str(), &file) != 0) return 0;
   TextWriter text(nowhere);

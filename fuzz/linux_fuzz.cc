@@ -57,10 +57,7 @@ void Restore(const Target &target) {
   }
 }
 
-}  // namespace
-
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  MakeFolder();
+const bool isWhole = [] {
   for (const Target &target : kTargets) Restore(target);
   for (const char *empty : {"/proc/1/fd", "/boot/loader/entries"}) {
     std::filesystem::create_directories(folder + empty);
@@ -68,11 +65,14 @@ extern "C" int LLVMFuzzerInitialize(int *, char ***) {
   Write(FUNCTION "/vendor", "0x8086\n", 7);
   Write(FUNCTION "/device", "0x2922\n", 7);
   setenv("ZELLIBS_HOST", ("linux:" + folder).c_str(), 1);
-  return symlink("../../../../bus/pci/drivers/ahci", (folder + FUNCTION "/driver").c_str());
-}
+  return symlink("../../../../bus/pci/drivers/ahci", (folder + FUNCTION "/driver").c_str()) == 0;
+}();
+
+}  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   if (size == 0) return 0;
+  if (!isWhole) abort();
   for (const Target &target : kTargets) {
     if (target.letter != static_cast<char>(data[0])) continue;
     Write(target.path, data + 1, size - 1);

@@ -46,11 +46,6 @@ void CheckClass(uint16_t classCode) {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  Silence();
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   BuildPciTablesFrom(FilesOf(data, size));
   for (unsigned number = 0; number < 64; ++number) {

@@ -35,14 +35,6 @@ void ReadContent(uint32_t number, KIF_ParamList *instance) {
   KIFData_Destroy(output);
 }
 
-// Every text of a record ends within its field or fills it; the sanitizer sees the rest.
-void ReadAnswer(const NodeInfo &node, uint32_t number, KIF_ParamList *instance, size_t count) {
-  if (node.hasRecords && node.parameterCount == count) {
-    KIF_Get(number, instance, record, node.recordSize);
-  }
-  if (node.hasContents && node.parameterCount == count) ReadContent(number, instance);
-}
-
 void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t count);
 
 void ReadBelow(const char *const *prefixes, KIF_ParamList *list, KIF_ParamList *selector,
@@ -64,7 +56,10 @@ void ReadInstances(const char *const *prefixes, KIF_ParamList *selector, size_t 
   for (uint32_t number = 1; number <= kNodeCount; ++number) {
     const NodeInfo &node = kNodes[number - 1];
     if (!IsAsked(node, prefixes)) continue;
-    ReadAnswer(node, number, selector, count);
+    const bool fits = node.parameterCount == count;
+    // Every text of a record ends within its field or fills it; the sanitizer sees the rest.
+    if (fits && node.hasRecords) KIF_Get(number, selector, record, node.recordSize);
+    if (fits && node.hasContents) ReadContent(number, selector);
     if (!node.hasLists || CountOfListParameters(node) != count) continue;
     KIF_ParamList *list = nullptr;
     if (KIF_GetInstanceListAlloc(number, selector, &list) != 0) continue;

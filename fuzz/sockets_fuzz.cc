@@ -5,15 +5,14 @@
 #include "surroundings.h"
 
 namespace {
-int process;
-}
 
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  MakeFolder();
+const int process = [] {
   std::filesystem::create_directory(folder + "/ns");
-  process = open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
-  return process == -1 ? 1 : symlink("net:[1]", (folder + "/ns/net").c_str());
-}
+  if (symlink("net:[1]", (folder + "/ns/net").c_str()) != 0) abort();
+  return open(folder.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
+}();
+
+}  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   if (size == 0 || data[0] < 'a' || data[0] >= 'a' + std::size(kTables)) return -1;

@@ -1,4 +1,5 @@
-// What several targets work with: a folder in memory, and no messages.
+// What several targets work with: a folder in memory, no messages, and no host but one that the
+// target chooses.
 #pragma once
 
 #include <fcntl.h>
@@ -13,16 +14,19 @@ namespace {
 
 std::string folder = "/dev/shm/zlkkiftools-fuzz.XXXXXX";
 
+[[maybe_unused]] FILE *const nowhere = fopen("/dev/null", "w");
+
 // Makes the folder, which is removed at the end; without it there is nothing to be done.
-[[maybe_unused]] void MakeFolder() {
-  if (mkdtemp(folder.data()) == nullptr) abort();
+[[maybe_unused]] const bool isPrepared = [] {
+  if (nowhere == nullptr || mkdtemp(folder.data()) == nullptr) abort();
   static const pid_t owner = getpid();
   atexit([] {
     if (getpid() != owner) return;
     std::error_code ignored;
     std::filesystem::remove_all(folder, ignored);
   });
-}
+  return setenv("ZELLIBS_HOST", "none", 1) == 0;
+}();
 
 // Writes a file of the folder, with the folders it needs.
 [[maybe_unused]] void Write(const std::string &path, const void *bytes, size_t size) {
@@ -36,11 +40,10 @@ std::string folder = "/dev/shm/zlkkiftools-fuzz.XXXXXX";
   close(file);
 }
 
-// The tools' messages go nowhere; what the fuzzer says goes to descriptor 2.
-[[maybe_unused]] FILE *Silence() {
-  stderr = fopen("/dev/null", "w");
-  if (stderr == nullptr) abort();
-  return stderr;
-}
-
 }  // namespace
+
+// The tools' messages go nowhere; what the fuzzer says goes to descriptor 2.
+extern "C" int LLVMFuzzerInitialize(int *, char ***) {
+  stderr = nowhere;
+  return 0;
+}

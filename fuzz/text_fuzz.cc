@@ -13,8 +13,7 @@
 
 namespace {
 
-FILE *nowhere;
-std::string path;
+const std::string path = folder + "/host.kif";
 
 std::string Build(const HostModel &model) {
   if (!WriteCacheFile(model, path.c_str())) abort();
@@ -40,13 +39,6 @@ std::string Dump() {
 }
 
 }  // namespace
-
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  MakeFolder();
-  path = folder + "/host.kif";
-  nowhere = Silence();
-  return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   HostModel model;

@@ -2,6 +2,7 @@
 // limits of memory, time and output that grow with the file: what asks for more is a fault, as is a
 // signal. The command lines take turns.
 #include <signal.h>
+#include <string.h>
 #include <sys/resource.h>
 #include <sys/time.h>
 #include <sys/wait.h>
@@ -17,12 +18,10 @@ namespace {
 
 constexpr rlim_t kMiB = 1 << 20;
 
-const char *const kRuns[][3] = {
-    {"ps", "-cgPTstvZUiz"}, {"ps", "-Jcz"},         {"lspci", "-vde"},     {"lspci", "-p"},
-    {"lsof"},               {"irqinfo"},            {"amldump"},           {"mdf", "-h"},
-    {"pidof", "sh"},        {"pgrep", "-lf", "."},  {"bootOption", "-ro"}, {"userspaceof", "1"},
-    {"zelvar", "-v"},       {"mdu", "-u"},          {"uptime"},            {"hwclock"},
-};
+const char *const kRuns[] = {
+    "ps -cgPTstvZUiz", "ps -Jcz", "lspci -vde", "lspci -p",    "lsof",           "irqinfo",
+    "amldump",         "mdf -h",  "pidof sh",   "pgrep -lf .", "bootOption -ro", "userspaceof 1",
+    "zelvar -v",       "mdu -u",  "uptime",     "hwclock"};
 size_t turn;
 
 void Limit(int resource, rlim_t most) {
@@ -38,12 +37,11 @@ rlim_t AddressSpace() {
   return rlim_t{pages} * 4096;
 }
 
-[[noreturn]] void Run(const char *const (&run)[3], size_t size) {
+[[noreturn]] void Run(const char *run, size_t size) {
   const int out = open((folder + "/out").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
-  const int nowhere = open("/dev/null", O_WRONLY);
   if (out < 0 || chdir(folder.c_str()) != 0) _exit(0);
   dup2(out, STDOUT_FILENO);
-  dup2(nowhere, STDERR_FILENO);
+  dup2(fileno(nowhere), STDERR_FILENO);
   Limit(RLIMIT_CORE, 0);
   Limit(RLIMIT_AS, AddressSpace() + 64 * kMiB + 200 * size);
   Limit(RLIMIT_FSIZE, 64 * kMiB + 200 * size);
@@ -56,11 +54,10 @@ rlim_t AddressSpace() {
     action.sa_handler = SIG_DFL;
     sigaction(number, &action, nullptr);
   }
-  std::string words[] = {"zlkkiftools", "-c", "host.kif", run[0], "", ""};
-  char *arguments[7] = {};
-  int count = 4;
-  for (int i = 1; i < 3 && run[i] != nullptr; ++i) words[count++] = run[i];
-  for (int i = 0; i < count; ++i) arguments[i] = words[i].data();
+  std::string words = std::string("zlkkiftools -c host.kif ") + run;
+  char *arguments[8] = {strtok(words.data(), " ")};
+  int count = 1;
+  while ((arguments[count] = strtok(nullptr, " ")) != nullptr) ++count;
   const int status = ProgramMain(count, arguments);
   fflush(stdout);
   _exit(status & 0x3f);
@@ -68,23 +65,17 @@ rlim_t AddressSpace() {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  MakeFolder();
-  setenv("ZELLIBS_HOST", "none", 1);
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   Write("/host.kif", data, size);
   if (KIF_UseCache((folder + "/host.kif").c_str(), 0) != 0) return 0;
   ReadHost(nullptr);  // shows the fuzzer the way; what a child does it does not see
-  const auto &run = kRuns[turn++ % std::size(kRuns)];
+  const char *run = kRuns[turn++ % std::size(kRuns)];
   const pid_t child = fork();
   if (child == 0) Run(run, size);
   int status = 0;
   if (child < 0 || waitpid(child, &status, 0) != child) return 0;
   if (WIFSIGNALED(status)) {
-    fprintf(stderr, "%s: ended by signal %d\n", run[0], WTERMSIG(status));
+    dprintf(STDERR_FILENO, "%s: ended by signal %d\n", run, WTERMSIG(status));
     abort();
   }
   std::error_code ignored;

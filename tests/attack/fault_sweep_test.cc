@@ -79,11 +79,8 @@ TEST_F(FaultSweep, OperationsOfTheTools) {
 
 TEST_F(FaultSweep, AllocationsOfTheTools) {
   for (const Command &command : kCommands) {
-    if (command.onCache) {
-      Sweep("allocations", command.Cached(host_), "none");
-    } else {
-      Sweep("allocations", command.Live(), host_);
-    }
+    const std::vector<std::string> line = command.onCache ? command.Cached(host_) : command.Live();
+    Sweep("allocations", line, command.onCache ? "none" : host_);
   }
 }
 

@@ -5,6 +5,7 @@ recording), first and last (what /proc and the peers said around all that), and 
 """
 import difflib
 import os
+import pathlib
 import re
 import subprocess
 
@@ -18,8 +19,7 @@ class Machine:
         self.faults = []
 
     def read(self, path):
-        with open(f'{self.folder}/{path}', 'rb') as file:
-            return file.read()
+        return pathlib.Path(self.folder, path).read_bytes()
 
     def text(self, path):
         return self.read(path).decode('utf-8', 'replace')
@@ -105,9 +105,9 @@ def judge_pci_modules(machine):
     for address, module in ours.items():
         peer = theirs.get(address, {})
         driver, modules = peer.get('driver in use', ''), peer.get('modules', '')
-        agrees = module.replace('_', '-') == driver.replace('_', '-') or \
-            (driver != '' and module in modules.split(', '))
-        machine.expect_that(agrees, f'module of {address}: {module} / {driver} of {modules}')
+        machine.expect_that(module.replace('_', '-') == driver.replace('_', '-') or
+                            (driver and module in modules.split(', ')),
+                            f'module of {address}: {module} / {driver} of {modules}')
 
 
 # Platform.
@@ -286,12 +286,12 @@ def judge_descriptors(machine):
 
 
 def judge_signals(machine):
-    names = ['first', 'second', 'third']
-    for stage, theirs in ('all', names), ('left', ['third']), ('none', []):
+    ends = {'first': '129', 'second': '143', 'third': '137'}
+    for stage, theirs in ('all', ends), ('left', ['third']), ('none', []):
         ours = sorted(line.split()[1] for line in machine.lines(f'signals/{stage}.out'))
         machine.expect(ours, [f'/tmp/busybox-{name}' for name in theirs], f'sleepers: {stage}')
-    ends = [machine.text(f'signals/{name}.ended').strip() for name in names]
-    machine.expect(ends, ['129', '143', '137'], 'what ended the sleepers')
+    for name, end in ends.items():
+        machine.expect(machine.text(f'signals/{name}.ended').strip(), end, f'end of {name}')
 
 
 # File systems.
@@ -361,8 +361,8 @@ def judge_recording(machine, release):
 
 def judge(folder, release, command_line):
     """What is wrong: one text a fault."""
-    with open(f'{os.path.dirname(os.path.abspath(__file__))}/commands') as file:
-        machine = Machine(folder, file.read().splitlines())
+    commands = pathlib.Path(__file__).with_name('commands').read_text()
+    machine = Machine(folder, re.split(r'; |\n', commands.strip()))
     machine.expect(machine.text('peers/cmdline.out').strip(), command_line, 'kernel command line')
     for check in (judge_pci_names, judge_pci_numbers, judge_pci_dumps, judge_pci_modules,
                   judge_interrupts, judge_acpi, judge_boot, judge_clocks, judge_worlds,
