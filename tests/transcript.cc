@@ -58,9 +58,7 @@ Lines Readable(const std::string &bytes, const std::string &prefix) {
   Lines lines = Split(bytes);
   for (std::string &line : lines) {
     std::string readable = prefix;
-    if (prefix.empty() && std::string("$!#[>=").find(line[0]) != std::string::npos) {
-      readable = line.empty() ? "" : "\\";
-    }
+    if (prefix.empty() && line.find_first_of("$!#[>=") == 0) readable = "\\";
     for (size_t i = 0; i < line.size();) {
       const auto *at = reinterpret_cast<const unsigned char *>(line.data()) + i;
       size_t length = SequenceLength(at, line.size() - i);
@@ -259,10 +257,7 @@ Lines CaseTest::RunCommand(const std::string &words, const std::string &program,
   line = "PATH=" + programs + ":$PATH\n" + line + program + arguments;
   std::vector<std::string> run = {signals ? "bash" : "sh", "-c", line};
   if (apart) run = Apart({"bash", "-c", line});
-  std::error_code none;
-  if (IsTool(program.substr(program.rfind(' ') + 1))) {
-    std::filesystem::remove(Scratch() + "/trace", none);
-  }
+  if (IsTool(program.substr(program.rfind(' ') + 1))) unlink((Scratch() + "/trace").c_str());
   Surroundings surroundings = {
       .environment = {"ZELLIBS_HOST=" + host, "ZELLIBS_TRACE=" + Scratch() + "/trace",
                       "SOURCE=" + Link(SOURCE_DIR), "LSTAT_DEVICE=" + Preload(LSTAT_DEVICE),
@@ -282,10 +277,7 @@ void CaseTest::Check(Part *command) {
   for (size_t i = 1; i < command->text.size(); ++i) line += "\n" + command->text[i].substr(2);
   static const std::regex kWords("(live |cached |apart )?((?:\\w+=\\S* )*)([^\\s;|&<>]+)([^]*)");
   std::smatch parts;
-  if (!std::regex_match(line, parts, kWords)) {
-    ADD_FAILURE_AT(case_.transcript->path.c_str(), command->line) << "no command";
-    return;
-  }
+  ASSERT_TRUE(std::regex_match(line, parts, kWords)) << "no command: " << line;
   const std::string way = parts[1], words = parts[2], program = parts[3], arguments = parts[4];
   const bool apart = way == "apart ";
   const bool cache = host_.ends_with(".kif") && IsTool(program) &&
@@ -305,8 +297,7 @@ void CaseTest::Compare(Part *command, const Lines &lines, const char *way) {
       command->text[0] + "  (" + way + ")\n" +
       Run({"diff", "-U2", "--label", "expected", "--label", "actual", expected, actual}).out;
   if (getenv("RENEW") == nullptr) {
-    GTEST_MESSAGE_AT_(case_.transcript->path.c_str(), command->line, what.c_str(),
-                      testing::TestPartResult::kNonFatalFailure);
+    ADD_FAILURE_AT(case_.transcript->path.c_str(), command->line) << what;
     return;
   }
   std::cout << case_.transcript->path << ":" << command->line << ": " << what;
@@ -353,12 +344,13 @@ std::vector<Case> ReadTranscript(Transcript *transcript) {
   return cases;
 }
 
-void RegisterTranscript(const std::filesystem::path &path, const std::string &suite) {
+void RegisterTranscript(const std::filesystem::path &path) {
   static std::set<std::string> names;
   const auto word = [](std::string text) {
     for (char &c : text) c = isalnum(static_cast<unsigned char>(c)) ? c : '_';
     return text;
   };
+  const std::string suite = word(path.parent_path().filename());
   static std::list<Transcript> transcripts;  // of which the tests have parts
   static std::list<Case> cases;
   transcripts.push_back({path, {}});
@@ -387,10 +379,5 @@ void RegisterTranscripts(const std::string &folder) {
     if (entry.path().extension() == ".transcript") files.push_back(entry.path());
   }
   std::sort(files.begin(), files.end());
-  const std::string suite = std::filesystem::path(folder).filename().string();
-  for (const auto &file : files) {
-    std::string name = suite;
-    std::replace(name.begin(), name.end(), '-', '_');
-    RegisterTranscript(file, name);
-  }
+  for (const auto &file : files) RegisterTranscript(file);
 }
