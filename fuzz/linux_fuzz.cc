@@ -13,7 +13,7 @@ struct Target {
   char letter;
   const char *path;
   const char *nodes[kMostPrefixes];
-  const char *whole;  // what the file holds while another one is under test; null: no such file
+  const char *whole;  // what the file holds while another one is under test
 };
 
 #define FUNCTION "/sys/bus/pci/devices/0000:00:1f.2"
@@ -30,7 +30,7 @@ constexpr Target kTargets[] = {
     {'m', "/proc/interrupts", {"hardware_int"}, " CPU0 CPU1\n 1: 2 3 IO-APIC 1-edge i8042\n"},
     {'n', "/proc/modules", {"system_modules", "hardware_pci"}, "ahci 40960 2 - Live 0x0\n"},
     {'o', "/proc/self/mountinfo", {"system_morelfs"}, "1 0 0:1 / / rw - tmpfs tmpfs rw\n"},
-    {'p', FUNCTION "/config", {"hardware_pci"}, nullptr},
+    {'p', FUNCTION "/config", {"hardware_pci"}, "\x86\x80\x22\x29"},
     {'q', FUNCTION "/uevent", {"hardware_pci"}, "DRIVER=ahci\n"},
     {'r', FUNCTION "/class", {"hardware_pci"}, "0x010601\n"},
     {'s', FUNCTION "/irq", {"hardware_pci"}, "16\n"},
@@ -50,11 +50,7 @@ constexpr Target kTargets[] = {
 };
 
 void Restore(const Target &target) {
-  if (target.whole != nullptr) {
-    Write(target.path, target.whole, strlen(target.whole));
-  } else {
-    unlink((folder + target.path).c_str());
-  }
+  Write(target.path, target.whole, strlen(target.whole));
 }
 
 const bool isWhole = [] {

@@ -45,15 +45,10 @@ rlim_t AddressSpace() {
   Limit(RLIMIT_CORE, 0);
   Limit(RLIMIT_AS, AddressSpace() + 64 * kMiB + 200 * size);
   Limit(RLIMIT_FSIZE, 64 * kMiB + 200 * size);
-  itimerval timer = {};
-  timer.it_value.tv_sec = static_cast<time_t>(2 + size / 10000);
+  const itimerval timer = {{}, {static_cast<time_t>(2 + size / 10000), 0}};
   setitimer(ITIMER_PROF, &timer, nullptr);
   signal(SIGPIPE, SIG_IGN);
-  for (const int number : {SIGPROF, SIGXFSZ, SIGSEGV, SIGBUS, SIGABRT}) {
-    struct sigaction action = {};
-    action.sa_handler = SIG_DFL;
-    sigaction(number, &action, nullptr);
-  }
+  for (const int number : {SIGPROF, SIGXFSZ, SIGSEGV, SIGBUS, SIGABRT}) signal(number, SIG_DFL);
   std::string words = std::string("zlkkiftools -c host.kif ") + run;
   char *arguments[8] = {strtok(words.data(), " ")};
   int count = 1;

@@ -54,10 +54,9 @@ class FaultSweep : public AttackTest {
     unlink((folder_ + "/DSDT.aml").c_str());  // amldump does not write over it
     const std::string counts = WriteFile("report", std::string(sizeof(Report), '\0'));
     Surroundings surroundings = Failing(operation, static_cast<int>(call));
-    for (const std::string &variable : {"FAIL_FROM=" + std::to_string(goesOn),
-                                        "FAIL_REPORT=" + counts, "ZELLIBS_TRACE=" + trace}) {
-      surroundings.environment.push_back(variable);
-    }
+    std::vector<std::string> &variables = surroundings.environment;
+    variables.insert(variables.end(), {"FAIL_FROM=" + std::to_string(goesOn),
+                                       "FAIL_REPORT=" + counts, "ZELLIBS_TRACE=" + trace});
     // kifcache ends at once where it has no memory.
     if (RunOn(host, commandLine, surroundings).err != "kifcache: out of memory\n") {
       EXPECT_EQ(ReadFile(trace).find("never destroyed"), std::string::npos)

@@ -132,13 +132,11 @@ void *ALLOCATOR(malloc)(size_t size);
 void *ALLOCATOR(calloc)(size_t count, size_t size);
 void *ALLOCATOR(realloc)(void *block, size_t size);
 
-#define ALLOCATION(name, parameters, arguments)             \
-  void *name parameters {                                   \
-    if (!Fails(#name, true, __builtin_return_address(0))) { \
-      return ALLOCATOR(name) arguments;                     \
-    }                                                       \
-    errno = ENOMEM;                                         \
-    return nullptr;                                         \
+#define ALLOCATION(name, parameters, arguments)                                             \
+  void *name parameters {                                                                   \
+    if (!Fails(#name, true, __builtin_return_address(0))) return ALLOCATOR(name) arguments; \
+    errno = ENOMEM;                                                                         \
+    return nullptr;                                                                         \
   }
 
 ALLOCATION(malloc, (size_t size) noexcept, (size))

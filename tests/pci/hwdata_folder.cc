@@ -7,7 +7,6 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
-#include <unistd.h>
 
 namespace {
 
@@ -39,8 +38,6 @@ int open64(const char *path, int flags, ...) __attribute__((alias("open")));
 DIR *opendir(const char *path) {
   char buffer[PATH_MAX];
   const int folder = openat(AT_FDCWD, Redirected(path, buffer), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  DIR *listing = folder >= 0 ? fdopendir(folder) : nullptr;
-  if (listing == nullptr && folder >= 0) close(folder);
-  return listing;
+  return folder >= 0 ? fdopendir(folder) : nullptr;
 }
 }
