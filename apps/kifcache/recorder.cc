@@ -19,6 +19,7 @@
 #include "redact.h"
 #include "status.h"
 
+// NOLINTNEXTLINE(readability-redundant-declaration): weak here alone.
 extern "C" __attribute__((weak)) bool KIF_HostIsForeign();
 
 namespace {
@@ -119,7 +120,8 @@ constexpr int64_t kNanoseconds = 1000000000;
 class Clock {
  public:
   explicit Clock(bool isThisMachine)
-      : fixed_(secure_getenv("SOURCE_DATE_EPOCH")), tellsBoot_(isThisMachine && fixed_ == nullptr) {}
+      : fixed_(secure_getenv("SOURCE_DATE_EPOCH")),
+        tellsBoot_(isThisMachine && fixed_ == nullptr) {}
 
   bool isFixed() const { return fixed_ != nullptr; }
   Moments Begin(const char *name) const {

@@ -16,9 +16,9 @@ inline bool IsTerminal(FILE *stream) {
   return answer != 0;
 }
 
-// A text that somebody chose freely, a file's name or a word of a command line, as it may stand in a
-// message anywhere: its control characters are '?', lest it forge a line of a log. Lives as long as
-// the call it is passed to.
+// A text that somebody chose freely, a file's name or a word of a command line, as it may stand in
+// a message anywhere: its control characters are '?', lest it forge a line of a log. Lives as long
+// as the call it is passed to.
 class Printable {
  public:
   explicit Printable(const char *text) : text_(text != nullptr ? strdup(text) : nullptr) {

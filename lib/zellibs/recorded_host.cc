@@ -177,7 +177,8 @@ int Compare(const Param &a, const Param &b) {
 // Lists are ascending, mostly.
 KIF_Status CheckEntriesStandOnce(const NodeInfo &node, const KIF_ParamList &list) {
   uint32_t ascending = 1;
-  while (ascending < list.count && Compare(list.params[ascending - 1], list.params[ascending]) < 0) {
+  while (ascending < list.count &&
+         Compare(list.params[ascending - 1], list.params[ascending]) < 0) {
     ++ascending;
   }
   if (ascending >= list.count || !EntriesSelect(node)) return KIF_STATUS_OK;
@@ -211,8 +212,7 @@ KIF_Status GetInstances(const NodeInfo &node, const KIF_ParamList *parent, KIF_P
   return status == KIF_STATUS_OK ? CheckEntriesStandOnce(node, *list) : status;
 }
 
-KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance,
-                       cache::Stored *answer) {
+KIF_Status FindContent(const NodeInfo &node, const KIF_ParamList *instance, cache::Stored *answer) {
   uint32_t hint = 0;
   const KIF_Status status = Find(AnswersOf(node)->all.contents, instance, &hint, answer);
   if (status == KIF_STATUS_OK && !HasBytes(recording, answer->place(), answer->length())) {

@@ -41,8 +41,8 @@ class SignatureCounter {
   Array<Entry> entries_;
 };
 
-// A file to be written, or none. One that is not finished is removed: a truncated table looks like a
-// table.
+// A file to be written, or none. One that is not finished is removed: a truncated table looks like
+// a table.
 class OutputFile {
  public:
   OutputFile() = default;
