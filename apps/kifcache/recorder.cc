@@ -19,9 +19,6 @@
 #include "redact.h"
 #include "status.h"
 
-// NOLINTNEXTLINE(readability-redundant-declaration): weak here alone.
-extern "C" __attribute__((weak)) bool KIF_HostIsForeign();
-
 namespace {
 
 constexpr uint32_t kMostContent = uint32_t{64} << 20;
