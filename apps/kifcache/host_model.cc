@@ -67,6 +67,19 @@ void HostModel::AddContent(NodeModel *node, const Values &instance, const Conten
                             line});
 }
 
+void HostModel::ReplaceRecord(cache::Record *record, std::string_view bytes) {
+  bytes = bytes.substr(0, bytes.find_last_not_of('\0') + 1);
+  const auto length = static_cast<uint32_t>(bytes.size());
+  *record = {record->selector(), record->status(), AddBytes(bytes), length};
+}
+
+void HostModel::ReplaceContent(cache::Stored *content, std::string_view bytes) {
+  const auto length = static_cast<uint32_t>(bytes.size());
+  *content = {content->selector(),    content->length_status(),
+              content->read_status(), length,
+              AddBytes(bytes),        length};
+}
+
 int HostModel::Compare(const cache::Parameter &left, const cache::Parameter &right) const {
   if (left.kind() != right.kind()) return left.kind() < right.kind() ? -1 : 1;
   if (left.kind() != cache::Kind::Text) {

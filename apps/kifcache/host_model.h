@@ -141,6 +141,11 @@ class HostModel {
   void AddContent(NodeModel *node, const Values &instance, const ContentAnswer &content,
                   uint32_t line = 0);
 
+  // Puts other bytes in the place of those of an answer that the model has. The zeros at a record's
+  // end are not kept.
+  void ReplaceRecord(cache::Record *record, std::string_view bytes);
+  void ReplaceContent(cache::Stored *content, std::string_view bytes);
+
   // Puts the answers of every node in the order of their selectors. False where one selector has
   // two answers of a kind; `*line` and `*firstLine` are then those of the two.
   bool Sort(uint32_t *line, uint32_t *firstLine);
@@ -150,6 +155,9 @@ class HostModel {
 
   const cache::Parameter *ParametersAt(uint32_t first) const { return parameters_.data() + first; }
   const uint8_t *BytesAt(uint64_t place) const { return bytes_.data() + place; }
+  std::string_view TextAt(uint64_t place, uint32_t length) const {
+    return {reinterpret_cast<const char *>(BytesAt(place)), length};
+  }
 
  private:
   cache::Selector AddParameters(const Values &values);

@@ -21,6 +21,7 @@
 #include "node_table.h"
 #include "output.h"
 #include "recorder.h"
+#include "redact.h"
 #include "status.h"
 #include "text_reader.h"
 #include "text_writer.h"
@@ -46,7 +47,8 @@ void AdviseOnRights(const Facts &facts) {
 int Record(const Arguments &given) {
   const char *path = given.operands[0];
   HostModel model;
-  if (!MayWriteRecording(path) || !RecordHost({given.Has(kRedact)}, &model)) return 1;
+  if (!MayWriteRecording(path) || !RecordHost(&model)) return 1;
+  if (given.Has(kRedact)) RedactModel(&model);
   if (!WriteCacheFile(model, path)) return 1;
   AdviseOnRights(model.facts);
   return 0;

@@ -1,10 +1,6 @@
 #include "recorder.h"
 
 #include <stdio.h>
-#include <stdlib.h>
-#include <sys/utsname.h>
-#include <time.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cinttypes>
@@ -12,56 +8,17 @@
 #include <set>
 
 #include "cache_bounds.h"
+#include "host_answer.h"
 #include "kif/kif.h"
+#include "machine_facts.h"
 #include "progress.h"
-#include "records/platform.h"
-#include "records/worlds.h"
 #include "redact.h"
 #include "status.h"
 
 namespace {
 
-constexpr uint32_t kMostContent = uint32_t{64} << 20;
-constexpr uint32_t kChunk = 3 << 20;                      // of a content that is asked for at once
 constexpr uint64_t kMostPcpuRecords = uint64_t{2} << 20;  // a count may be anything
 constexpr uint64_t kMostRecorded = kMostModelSize / 2;    // then answers are left out
-
-// The numbers behind the nodes are the library's; those beyond the tools have no variable.
-const KIF_NodeId *const kNodeIds[kNodeCount] = {
-#define NODE(path, ...) &KIF_NODE_##path,
-#define BEYOND(...) nullptr,
-#include "nodes.def"
-};
-
-uint32_t NumberOf(NodeIndex node) {
-  return kNodeIds[node] != nullptr ? *kNodeIds[node] : node + 1u;
-}
-
-// Whether the library's catalogue is this one, so that it numbers the nodes without a variable so.
-bool HasOurCatalogue() {
-  uint64_t hash = 0;
-  return KIF_Get(kCatalogueNumber, nullptr, &hash, sizeof(hash)) == 0 && hash == CatalogueHash();
-}
-
-[[noreturn]] void OutOfMemory() {
-  fputs("kifcache: out of memory\n", stderr);
-  exit(1);
-}
-
-// The selecting list of `values`.
-ParamListHandle ListOf(const Values &values) {
-  ParamListHandle list = CreateInstance();
-  if (list == nullptr) OutOfMemory();
-  for (const Value &value : values) {
-    const KIF_Status status =
-        value.kind == cache::Kind::Integer
-            ? KIF_ParamListAddInt(list.get(), value.integer)
-            : KIF_ParamListAddString(
-                  list.get(), value.kind == cache::Kind::Text ? value.text.c_str() : nullptr);
-    if (status != 0) OutOfMemory();
-  }
-  return list;
-}
 
 Values Joined(const Values &values, Value last) {
   Values joined = values;
@@ -110,61 +67,27 @@ void DropRepeated(Values *values) {
   std::erase_if(*values, [&seen](const Value &value) { return !seen.insert(value).second; });
 }
 
-constexpr int64_t kNanoseconds = 1000000000;
-
-// Moments of the recording. SOURCE_DATE_EPOCH fixes those of the wall clock, in seconds, and takes
-// away what differs from run to run; the time since the boot is that of this machine alone.
-class Clock {
- public:
-  explicit Clock(bool isThisMachine)
-      : fixed_(secure_getenv("SOURCE_DATE_EPOCH")),
-        tellsBoot_(isThisMachine && fixed_ == nullptr) {}
-
-  bool isFixed() const { return fixed_ != nullptr; }
-  Moments Begin(const char *name) const {
-    const int64_t now = Now();
-    const int64_t sinceBoot = SinceBoot();
-    return {name, now, now, sinceBoot, sinceBoot};
-  }
-  void End(Moments *of) const {
-    of->end = Now();
-    of->endSinceBoot = SinceBoot();
-  }
-
- private:
-  static int64_t Read(clockid_t clock) {
-    struct timespec time = {};
-    clock_gettime(clock, &time);
-    return int64_t{time.tv_sec} * kNanoseconds + time.tv_nsec;
-  }
-  int64_t Now() const {
-    return fixed_ != nullptr ? strtoll(fixed_, nullptr, 10) * kNanoseconds : Read(CLOCK_REALTIME);
-  }
-  int64_t SinceBoot() const { return tellsBoot_ ? Read(CLOCK_BOOTTIME) : 0; }
-
-  const char *const fixed_;
-  const bool tellsBoot_;
-};
-
 class Recorder {
  public:
-  Recorder(const RecordOptions &options, const Clock &clock, HostModel *model)
-      : options_(options), clock_(clock), model_(model) {
+  Recorder(const RecordingClock &clock, HostModel *model) : clock_(clock), model_(model) {
     for (const NodeInfo &node : kNodes) models_[IndexOf(node)] = model->NodeOf(node.path);
   }
 
   void Record();
 
  private:
+  // Asks for one answer and stores it; all the rest finds out what to ask for.
+  void RecordAnswer(const Question &question, HostAnswer *answer);
+  void Store(const Question &question, const HostAnswer &answer);
+
   void RecordRows(size_t first, size_t end);
   Moments *MomentsOf(Group group);
   void RecordOwnLists(const NodeInfo &node);
   void RecordTogether(size_t first, size_t end);
   void RecordByPcpu(size_t first, size_t end);
   void RecordAnswers(size_t first, size_t end, const Values &instance);
-  void RecordList(const NodeInfo &node, const Values &parent, Values *entries);
-  void RecordRecord(const NodeInfo &node, const Values &instance, KIF_ParamList *selector);
-  void RecordContent(const NodeInfo &node, const Values &instance, KIF_ParamList *selector);
+  void NoteCartel(const std::string &record);
+  Values RecordList(const NodeInfo &node, const Values &parent);
 
   const std::vector<Values> &ListInstances(NodeIndex list);
   const std::vector<Values> &Parents(const NodeInfo &node);
@@ -175,11 +98,10 @@ class Recorder {
   bool HasRoom(const NodeInfo &node);
   void TellLacks();
 
-  const RecordOptions &options_;
-  const Clock &clock_;
+  const RecordingClock &clock_;
   HostModel *model_;
   NodeModel *models_[kNodeCount];
-  const bool hasOurCatalogue_ = HasOurCatalogue();
+  Asker asker_;
   // The instances of each list node, each once, as parameters from the outermost one on.
   bool walked_[kNodeCount] = {};
   std::vector<Values> instances_[kNodeCount];
@@ -203,7 +125,7 @@ void Recorder::Record() {
 // Records the rows from `first` up to `end`, which are of one group and share their instances.
 void Recorder::RecordRows(size_t row, size_t end) {
   const NodeInfo &node = kNodes[row];
-  if (!node.hasVariable && !hasOurCatalogue_) return;
+  if (!asker_.Knows(node)) return;
   Moments *of = MomentsOf(node.group);
   if (!node.hasLists) {
     RecordTogether(row, end);
@@ -236,7 +158,7 @@ void Recorder::TellLacks() {
   for (const NodeInfo &node : kNodes) {
     const uint64_t refused = refused_[IndexOf(node)];
     const uint64_t omitted = omitted_[IndexOf(node)];
-    if (!node.hasVariable && !hasOurCatalogue_) {
+    if (!asker_.Knows(node)) {
       lacks.push_back({node.path, cache::Reason::Unasked, 0, 0});
     }
     if (refused != 0) {
@@ -246,41 +168,47 @@ void Recorder::TellLacks() {
   }
 }
 
-// Records the instances below `parent` and gives them in `*entries`; those of a failing list are
-// none.
-void Recorder::RecordList(const NodeInfo &node, const Values &parent, Values *entries) {
-  entries->clear();
+void Recorder::RecordAnswer(const Question &question, HostAnswer *answer) {
+  *answer = {};
+  answer->status = KIF_STATUS_NOT_FOUND;
+  const NodeInfo &node = kNodes[question.node];
   if (!HasRoom(node)) return;
-  const ParamListHandle selector = ListOf(parent);
-  KIF_ParamList *fetched = nullptr;
-  KIF_Status status = KIF_GetInstanceListAlloc(NumberOf(IndexOf(node)), selector.get(), &fetched);
-  if (status == 0 && fetched == nullptr) status = KIF_STATUS_FAILURE;
-  if (status == KIF_STATUS_NOT_FOUND) return;
-  const ParamListHandle list(status == 0 ? fetched : nullptr);
-  const int32_t count = status == 0 ? KIF_ParamListUsedCount(list.get()) : 0;
-  for (int32_t i = 0; i < count; ++i) {
-    KIF_Param *param = KIF_ParamListGetParam(list.get(), static_cast<uint32_t>(i));
-    if (param != nullptr && param->type == KIF_PARAM_INTEGER) {
-      entries->push_back(IntegerValue(KIF_ParamGetInt(param)));
-    } else if (param != nullptr && param->type == KIF_PARAM_STRING) {
-      entries->push_back(TextValue(KIF_ParamGetString(param)));
-    } else {
-      ++omitted_[IndexOf(node)];
-    }
-  }
+  asker_.Ask(question, answer);
   // A tree of files may name a process twice.
-  if (EntriesSelect(node)) DropRepeated(entries);
-  if (status == KIF_STATUS_NO_PERMISSION) ++refused_[IndexOf(node)];
-  model_->AddList(models_[IndexOf(node)], parent, status, *entries);
+  if (EntriesSelect(node)) DropRepeated(&answer->entries);
+  Store(question, *answer);
+}
+
+// What is not found is what a file answers anyway.
+void Recorder::Store(const Question &question, const HostAnswer &answer) {
+  NodeModel *model = models_[question.node];
+  omitted_[question.node] += answer.omitted;
+  if (answer.status == KIF_STATUS_NO_PERMISSION) ++refused_[question.node];
+  if (question.kind == AnswerKind::kContent) {
+    if (answer.content.lengthStatus == KIF_STATUS_NOT_FOUND) return;
+    model_->AddContent(model, question.instance, answer.content);
+  } else if (answer.status == KIF_STATUS_NOT_FOUND) {
+    return;
+  } else if (question.kind == AnswerKind::kList) {
+    model_->AddList(model, question.instance, answer.status, answer.entries);
+  } else {
+    model_->AddRecord(model, question.instance, answer.status, answer.record);
+  }
+}
+
+// Records the instances below `parent`; those of a failing list are none.
+Values Recorder::RecordList(const NodeInfo &node, const Values &parent) {
+  HostAnswer answer;
+  RecordAnswer({IndexOf(node), AnswerKind::kList, parent}, &answer);
+  return std::move(answer.entries);
 }
 
 // Walks the lists of a node, the first time it is asked for.
 const std::vector<Values> &Recorder::ListInstances(NodeIndex list) {
   if (walked_[list]) return instances_[list];
   walked_[list] = true;
-  Values entries;
   for (const Values &parent : Parents(kNodes[list])) {
-    RecordList(kNodes[list], parent, &entries);
+    Values entries = RecordList(kNodes[list], parent);
     DropRepeated(&entries);
     for (Value &entry : entries) instances_[list].push_back(Joined(parent, std::move(entry)));
   }
@@ -313,20 +241,18 @@ void Recorder::AddCartelsOfWorlds() {
 }
 
 uint64_t Recorder::CountPcpus() {
-  const NodeInfo &node = kNodes[kNode_hardware_cpu_cpuInfo];
-  std::string record(node.recordSize, '\0');
-  const KIF_Status status =
-      KIF_Get(KIF_NODE_hardware_cpu_cpuInfo, nullptr, record.data(), node.recordSize);
-  return status == 0 ? FieldOf(node, "numPcpus", record) : 0;
+  HostAnswer answer;
+  asker_.Ask({kNode_hardware_cpu_cpuInfo, AnswerKind::kRecord, {}}, &answer);
+  if (answer.status != 0) return 0;
+  return FieldOf(kNodes[kNode_hardware_cpu_cpuInfo], "numPcpus", answer.record);
 }
 
 // Records the instances below each parent, and the record of each of them.
 void Recorder::RecordOwnLists(const NodeInfo &node) {
   const bool byPlace = node.instances == Instances::kOwnListIndex;
   const size_t row = IndexOf(node);
-  Values entries;
   for (const Values &parent : Parents(node)) {
-    RecordList(node, parent, &entries);
+    Values entries = RecordList(node, parent);
     if (!byPlace) DropRepeated(&entries);
     int64_t place = 0;
     for (const Value &entry : entries) {
@@ -365,116 +291,25 @@ void Recorder::RecordByPcpu(size_t first, size_t end) {
 }
 
 void Recorder::RecordAnswers(size_t first, size_t end, const Values &instance) {
-  const ParamListHandle selector = instance.empty() ? nullptr : ListOf(instance);
+  HostAnswer answer;
   for (size_t row = first; row < end; ++row) {
-    const NodeInfo &node = kNodes[row];
-    if (!HasRoom(node)) continue;
-    if (node.hasRecords) RecordRecord(node, instance, selector.get());
-    if (node.hasContents) RecordContent(node, instance, selector.get());
+    const auto node = static_cast<NodeIndex>(row);
+    if (kNodes[row].hasRecords) {
+      RecordAnswer({node, AnswerKind::kRecord, instance}, &answer);
+      if (node == kNode_world_info && answer.status == 0) NoteCartel(answer.record);
+    }
+    if (kNodes[row].hasContents) RecordAnswer({node, AnswerKind::kContent, instance}, &answer);
   }
 }
 
-void Recorder::RecordRecord(const NodeInfo &node, const Values &instance, KIF_ParamList *selector) {
-  const NodeIndex index = IndexOf(node);
-  std::string record(node.recordSize, '\0');
-  const KIF_Status status = KIF_Get(NumberOf(index), selector, record.data(), node.recordSize);
-  if (status == KIF_STATUS_NOT_FOUND) return;
-  if (status == KIF_STATUS_NO_PERMISSION) ++refused_[index];
-  if (status != 0) record.clear();
-  if (status == 0 && index == kNode_world_info) {
-    const uint64_t cartel = FieldOf(node, "cartelID", record);
-    if (cartel != 0) cartelsOfWorlds_.insert({IntegerValue(static_cast<int64_t>(cartel))});
-  }
-  if (options_.redact && status == 0) RedactRecord(node, &record);
-  model_->AddRecord(models_[index], instance, status, record);
+// Notes the cartel that the record of a world names.
+void Recorder::NoteCartel(const std::string &record) {
+  const uint64_t cartel = FieldOf(kNodes[kNode_world_info], "cartelID", record);
+  if (cartel != 0) cartelsOfWorlds_.insert({IntegerValue(static_cast<int64_t>(cartel))});
 }
 
-// Reads the content in chunks into `*bytes`. The result is that of the first chunk that fails.
-KIF_Status ReadContent(uint32_t node, KIF_ParamList *selector, uint32_t total, std::string *bytes) {
-  const uint32_t wanted = std::min(total, kChunk);
-  while (bytes->size() < total) {
-    const uint32_t request[] = {static_cast<uint32_t>(bytes->size()), wanted};
-    const DataHandle input(KIFData_Create(sizeof(request), request, sizeof(request)));
-    const DataHandle output(KIFData_Create(wanted + 1, nullptr, 0));
-    if (input == nullptr || output == nullptr) OutOfMemory();
-    const KIF_Status status = KIF_SetData(node, selector, input.get(), output.get());
-    if (status != 0) return status;
-    const uint32_t given = std::min(output->length, wanted);
-    if (given == 0) break;
-    const void *read = KIFData_GetData(output.get());
-    if (read == nullptr) OutOfMemory();
-    bytes->append(static_cast<const char *>(read), given);
-  }
-  return 0;
-}
-
-void Recorder::RecordContent(const NodeInfo &node, const Values &instance,
-                             KIF_ParamList *selector) {
-  const uint32_t id = NumberOf(IndexOf(node));
-  ContentAnswer content;
-  content.lengthStatus = KIF_GetDataLength(id, selector, &content.total);
-  if (content.lengthStatus == KIF_STATUS_NOT_FOUND) return;
-  if (content.lengthStatus != 0) {
-    content.readStatus = content.lengthStatus;
-    content.total = 0;
-  } else if (content.total > kMostContent) {
-    content.readStatus = KIF_STATUS_TOO_LARGE;
-    ++omitted_[IndexOf(node)];
-  } else {
-    content.readStatus = ReadContent(id, selector, content.total, &content.bytes);
-    if (content.readStatus != 0) content.bytes.clear();
-  }
-  if (content.readStatus == KIF_STATUS_NO_PERMISSION) ++refused_[IndexOf(node)];
-  if (options_.redact && content.readStatus == 0) {
-    RedactContent(node, &content.bytes);
-    content.total = static_cast<uint32_t>(content.bytes.size());
-  }
-  model_->AddContent(models_[IndexOf(node)], instance, content);
-}
-
-// The host may be a file or a tree of files from elsewhere. No node has the name of the machine,
-// but one has the release of its kernel: where that is not this machine's, nothing else here is
-// either.
-void TellOfMachine(Facts *facts) {
-  VersionRecord version = {};
-  struct utsname names;
-  const bool isKnown = KIF_Get(KIF_NODE_system_version, nullptr, &version, sizeof(version)) == 0;
-  version.product[sizeof(version.product) - 1] = version.version[sizeof(version.version) - 1] = 0;
-  facts->system = version.product;
-  facts->release = version.version;
-  if (uname(&names) == 0 && (HostType_OSIsZLK() || !isKnown || facts->release == names.release)) {
-    facts->name = names.nodename;
-    facts->system = names.sysname;
-    facts->release = names.release;
-    facts->architecture = names.machine;
-  }
-  facts->recorder = "kifcache " KIFCACHE_VERSION;
-  facts->rights = geteuid() == 0 ? "root" : "user " + std::to_string(geteuid());
-}
-
-// Whether the host can be asked at all. A world that no host has is refused or not found; any other
-// answer says what is wrong with the host itself, such as a file that is none.
-KIF_Status StatusOfHost() {
-  const ParamListHandle nobody = ListOf({IntegerValue(-1), IntegerValue(-1)});
-  const uint32_t size = kNodes[kNode_world_info].recordSize;
-  std::string record(size, '\0');
-  const KIF_Status status = KIF_Get(KIF_NODE_world_info, nobody.get(), record.data(), size);
-  const bool isAnswer = status == KIF_STATUS_NOT_FOUND || status == KIF_STATUS_BAD_PARAMETER;
-  return isAnswer || HostType_OSIsZLK() ? KIF_STATUS_OK : status;
-}
-
-// What only this machine has, where it is the host.
-void TellOfBoot(const Clock &clock, Facts *facts) {
-  char bootID[37] = "";
-  FILE *file = fopen("/proc/sys/kernel/random/boot_id", "re");
-  if (file != nullptr && fgets(bootID, sizeof(bootID), file) != nullptr) facts->bootID = bootID;
-  if (file != nullptr) fclose(file);
-  if (!clock.isFixed()) facts->recorderCartel = getpid();
-}
-
-}  // namespace
-
-bool RecordHost(const RecordOptions &options, HostModel *model) {
+// Whether the present host can be recorded, and the build date of its kernel; says why not.
+bool CanBeRecorded(std::string *kernelBuildDate) {
   if (!HostType_OSIsZLK() && !HostType_OSIsSimulator()) {
     fputs("kifcache: there is no host to record\n", stderr);
     return false;
@@ -490,18 +325,25 @@ bool RecordHost(const RecordOptions &options, HostModel *model) {
     return false;
   }
   date[sizeof(date) - 1] = '\0';
-  TellOfMachine(&model->facts);
-  model->facts.kernelBuildDate = date;
+  *kernelBuildDate = date;
+  return true;
+}
+
+}  // namespace
+
+bool RecordHost(HostModel *model) {
+  Facts &facts = model->facts;
+  if (!CanBeRecorded(&facts.kernelBuildDate)) return false;
+  TellOfMachine(&facts);
   const bool isThisMachine = KIF_HostIsForeign == nullptr || !KIF_HostIsForeign();
-  const Clock clock(isThisMachine);
-  if (isThisMachine) TellOfBoot(clock, &model->facts);
-  if (options.redact) model->facts.redaction = kRedactionRules;
+  const RecordingClock clock(isThisMachine);
+  if (isThisMachine) TellOfBoot(clock, &facts);
   Moments whole = clock.Begin("recording");
-  Recorder(options, clock, model).Record();
+  Recorder(clock, model).Record();
   clock.End(&whole);
-  model->facts.begin = whole.begin / kNanoseconds;
-  model->facts.end = whole.end / kNanoseconds;
-  model->facts.moments.insert(model->facts.moments.begin(), whole);
+  facts.begin = whole.begin / kNanoseconds;
+  facts.end = whole.end / kNanoseconds;
+  facts.moments.insert(facts.moments.begin(), whole);
   uint32_t line;
   uint32_t firstLine;
   (void)model->Sort(&line, &firstLine);

@@ -4,12 +4,8 @@
 
 #include "host_model.h"
 
-struct RecordOptions {
-  bool redact = false;  // leave the arguments of command lines and the values of boot options out
-};
-
 // Walks every node of the host into `model`, which is empty before and sorted after. Answers are
 // recorded as they are, failing ones with their status; "not found" is what a file answers anyway.
 // What is too large to keep is left out and counted in the facts. Where there is no host to record
 // says so on standard error and gives false.
-bool RecordHost(const RecordOptions &options, HostModel *model);
+bool RecordHost(HostModel *model);

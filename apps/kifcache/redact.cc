@@ -65,8 +65,6 @@ std::string Redacted(std::string_view text, Privacy privacy) {
   }
 }
 
-}  // namespace
-
 void RedactRecord(const NodeInfo &node, std::string *record) {
   const MarkedAnswer answer = {nullptr, *record};
   for (size_t i = 0; i < node.fieldCount; ++i) {
@@ -82,7 +80,29 @@ void RedactRecord(const NodeInfo &node, std::string *record) {
   }
 }
 
-void RedactContent(const NodeInfo &node, std::string *content) {
-  const Privacy privacy = MarksOfOtherBytes(node).privacy.Of({nullptr, *content});
-  if (privacy != Privacy::kPublic) *content = kEllipsis;
+void RedactNode(const NodeInfo &node, NodeModel *of, HostModel *model) {
+  for (auto &[record, line] : of->records) {
+    if (record.status() != 0) continue;
+    std::string bytes(model->TextAt(record.place(), record.length()));
+    bytes.resize(node.recordSize);
+    RedactRecord(node, &bytes);
+    model->ReplaceRecord(&record, bytes);
+  }
+  for (auto &[content, line] : of->contents) {
+    const std::string_view bytes = model->TextAt(content.place(), content.length());
+    const Privacy privacy = MarksOfOtherBytes(node).privacy.Of({nullptr, bytes});
+    if (content.read_status() == 0 && privacy != Privacy::kPublic) {
+      model->ReplaceContent(&content, kEllipsis);
+    }
+  }
+}
+
+}  // namespace
+
+void RedactModel(HostModel *model) {
+  model->facts.redaction = kRedactionRules;
+  for (auto &[path, of] : model->nodes) {
+    const NodeInfo *node = FindNodeByPath(path.data(), path.size());
+    if (node != nullptr) RedactNode(*node, &of, model);
+  }
 }
