@@ -1,5 +1,18 @@
 // The marks of the catalogue: what of a node's answers is private, and what changes by itself. What
 // no mark says is private, as is everything of a node that the catalogue does not have.
+//
+// Of a new row, mark
+// - numbers, and texts that the kernel or a driver chose from words of its own: kPublic. They stay
+//   in a redacted recording as they are, and kifcache(1) has to name the texts among them;
+// - a text that names a thing which another answer may name, too: by what it names. Each such name
+//   becomes a numbered one of its kind, "address-3", the same everywhere in a recording. As a
+//   parameter it still tells its instance from the others;
+// - any other text (values, options, arguments) and any content: kPrivate, or nothing at all. It
+//   becomes "…"; a parameter becomes a numbered name;
+// - numbers and bytes that are private (a serial number): kPrivate. They become zeros, and of a
+//   record that begins with `known` the field's bit is cleared;
+// - the bytes of a record that no field names: nothing, and they become zeros. kWithheld where the
+//   record would then say what is not so: it is answered with "no permission".
 #pragma once
 
 #include <cstdint>
@@ -16,15 +29,20 @@ enum class Change : uint8_t {
 
 enum class Privacy : uint8_t {
   kPublic,
-  kPrivate,          // as a whole
-  kCommandLine,      // but for its first word, the program
-  kBootCommandLine,  // but for its first word, the kernel, and the names of options
-  kSocket,           // but for its first word, the protocol
+  kPrivate,   // as a whole
+  kWithheld,  // and its record with it; of bytes that no field names
+  // Texts of which something stays, as kifcache(1) tells.
+  kCommandLine,      // of the cartel that is the first parameter
+  kBootCommandLine,  // the kernel, and options
+  kSocket,           // protocol, addresses, state
   // Texts that name a thing.
   kAddress,
   kPath,
   kMountPoint,
   kBootEntry,
+  kUser,
+  kDevice,
+  kName,  // of anything else
 };
 
 // An answer by which a mark may depend on the instance or the value. A record is shorter than its
