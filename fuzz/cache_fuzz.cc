@@ -1,9 +1,11 @@
-// Any bytes as a cache file: opened, served, checked, shown in both forms. What `kifcache check`
+// Any bytes as a cache file: opened, served, checked, shown in both forms, redacted. What `kifcache check`
 // calls whole, every answer of which was visited, must also be shown to its end.
 #include "cache_file.h"
 #include "check.h"
+#include "file_model.h"
 #include "json_writer.h"
 #include "read_host.h"
+#include "redact.h"
 #include "surroundings.h"
 #include "text_writer.h"
 #include "zellibs.h"
@@ -28,6 +30,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   const bool isShown = Show(file, &text);
   if (isShown != Show(file, &json)) abort();
   if (CheckFile(path.c_str(), file, true, nowhere) && !isShown) abort();
+  HostModel model;
+  if (isShown && FitsCatalogue(file, nullptr, nullptr) && ReadKnown("", file, &model)) {
+    RedactModel("", &model);
+  }
   CloseCacheFile(&file);
   if (KIF_UseCache(path.c_str(), 0) != 0) abort();
   char date[21];

@@ -132,7 +132,8 @@ void PrintFacts(const CacheFile &file, const Facts &facts, FILE *stream) {
 
 // What is missing in words, and with which rights it was asked for.
 void PrintLacks(const Facts &facts, const Refusals &refusals, FILE *stream) {
-  const bool mayHelp = refusals.HasForbidden() && facts.rights.starts_with("user ");
+  const bool mayHelp =
+      refusals.HasForbidden() && facts.rights.starts_with("user ") && facts.redaction.empty();
   PrintLine("rights", Shown(facts.rights) + (mayHelp ? ": root records a whole picture" : ""),
             stream);
   for (const std::string &text : facts.omitted) PrintLine("omitted", Shown(text), stream);

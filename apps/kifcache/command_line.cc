@@ -176,6 +176,14 @@ bool Arguments::Has(const Option &option) const {
   return false;
 }
 
+const char *Arguments::Of(const Option &option) const {
+  const char *argument = nullptr;
+  for (const Choice &choice : options) {
+    if (choice.option == &option) argument = choice.argument;
+  }
+  return argument;
+}
+
 int RunCommandLine(int argc, char **argv) {
   const std::string_view name = argc > 1 ? argv[1] : "";
   if (const Command *command = FindCommand(name)) return Run(*command, argc - 1, argv + 1);

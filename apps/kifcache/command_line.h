@@ -23,6 +23,8 @@ struct Arguments {
   std::vector<const char *> operands;
 
   bool Has(const Option &option) const;
+  // The argument of an option, the last one; null where it was not given.
+  const char *Of(const Option &option) const;
 };
 
 struct Command {

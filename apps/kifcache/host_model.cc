@@ -73,11 +73,16 @@ void HostModel::ReplaceRecord(cache::Record *record, std::string_view bytes) {
   *record = {record->selector(), record->status(), AddBytes(bytes), length};
 }
 
-void HostModel::ReplaceContent(cache::Stored *content, std::string_view bytes) {
+void HostModel::ReplaceContent(cache::Stored *content, uint32_t total, std::string_view bytes) {
   const auto length = static_cast<uint32_t>(bytes.size());
   *content = {content->selector(),    content->length_status(),
-              content->read_status(), length,
+              content->read_status(), total,
               AddBytes(bytes),        length};
+}
+
+void HostModel::ReplaceText(uint32_t parameter, const std::string &text) {
+  parameters_[parameter] = {AddBytes({text.c_str(), text.size() + 1}),
+                            static_cast<uint32_t>(text.size()), cache::Kind::Text};
 }
 
 int HostModel::Compare(const cache::Parameter &left, const cache::Parameter &right) const {

@@ -141,10 +141,11 @@ class HostModel {
   void AddContent(NodeModel *node, const Values &instance, const ContentAnswer &content,
                   uint32_t line = 0);
 
-  // Puts other bytes in the place of those of an answer that the model has. The zeros at a record's
-  // end are not kept.
+  // Puts other bytes in the place of those of an answer that the model has, or another text in the
+  // place of that of a parameter. The zeros at a record's end are not kept.
   void ReplaceRecord(cache::Record *record, std::string_view bytes);
-  void ReplaceContent(cache::Stored *content, std::string_view bytes);
+  void ReplaceContent(cache::Stored *content, uint32_t total, std::string_view bytes);
+  void ReplaceText(uint32_t parameter, const std::string &text);
 
   // Puts the answers of every node in the order of their selectors. False where one selector has
   // two answers of a kind; `*line` and `*firstLine` are then those of the two.

@@ -14,6 +14,7 @@
 #include "cache_writer.h"
 #include "check.h"
 #include "command_line.h"
+#include "file_model.h"
 #include "host_model.h"
 #include "input.h"
 #include "json_writer.h"
@@ -29,7 +30,9 @@
 namespace {
 
 constexpr Option kRedact = {
-    "redact", nullptr, "without the arguments of command lines and the values of boot options"};
+    "redact", nullptr,
+    "keep only numbers, names of worlds, modules and devices, and what kifcache(1) lists"};
+constexpr Option kName = {"name", "TEXT", "the name of a redacted host, in place of \"redacted\""};
 constexpr Option kVerbose = {"verbose", nullptr, "and how many answers there are of every node"};
 constexpr Option kJson = {"json", nullptr, "as JSON Lines"};
 
@@ -44,11 +47,20 @@ void AdviseOnRights(const Facts &facts) {
           refused);
 }
 
+// The name that a redacted host gets; empty where none is given.
+std::string NameGiven(const Arguments &given) {
+  return given.Has(kName) ? given.Of(kName) : "";
+}
+
 int Record(const Arguments &given) {
   const char *path = given.operands[0];
+  if (given.Has(kName) && !given.Has(kRedact)) {
+    Complain("record", "--name is the name of a redacted host: add --redact");
+    return 1;
+  }
   HostModel model;
   if (!MayWriteRecording(path) || !RecordHost(&model)) return 1;
-  if (given.Has(kRedact)) RedactModel(&model);
+  if (given.Has(kRedact)) RedactModel(NameGiven(given), &model);
   if (!WriteCacheFile(model, path)) return 1;
   AdviseOnRights(model.facts);
   return 0;
@@ -84,6 +96,16 @@ int Build(const Arguments &given) {
   return ReadText(input.text(), name, &model) && WriteCacheFile(model, path) ? 0 : 1;
 }
 
+int Redact(const Arguments &given) {
+  const char *path = given.operands[1];
+  if (!MayWriteRecording(path)) return 1;
+  const InputRecording input(given.operands[0]);
+  HostModel model;
+  if (!input.isOpen() || !ReadKnown(InputName(given.operands[0]), input.file(), &model)) return 1;
+  RedactModel(NameGiven(given), &model);
+  return WriteCacheFile(model, path) ? 0 : 1;
+}
+
 int Nodes(const Arguments &) {
   PrintNodes(stdout);
   return 0;
@@ -117,10 +139,15 @@ void EndWhenOutOfMemory() {
 }  // namespace
 
 const Command kCommands[] = {
-    {"record", "FILE", "save this host into FILE", Record, {&kRedact}},
+    {"record", "FILE", "save this host into FILE", Record, {&kRedact, &kName}},
     {"check", "FILE", "verify FILE and tell what is in it", Check, {&kVerbose}},
     {"dump", "FILE", "print what FILE holds as text", Dump, {&kJson}},
     {"build", "TEXT FILE", "make FILE from the text that dump prints", Build, {}},
+    {"redact",
+     "IN OUT",
+     "make OUT from the recording IN as record --redact does",
+     Redact,
+     {&kName}},
     {"nodes", "", "list the nodes and the named fields of their records", Nodes, {}},
     {},
 };

@@ -31,15 +31,35 @@ constexpr Marks kFieldMarks[] = {
 constexpr Marks kOtherMarks[] = {
 #define NODE(path, group, parameters, ...) {__VA_ARGS__},
 #define RECORD(type, routine, found, marks, ...) UNPACKED marks
-#define CONTENT(lengthRoutine, readRoutine, found, marks) UNPACKED marks
 #include "nodes.def"
 };
 static_assert(sizeof(kOtherMarks) / sizeof(kOtherMarks[0]) == kNodeCount);
+
+constexpr Marks kContentMarks[] = {
+#define NODE(path, group, parameters, ...) {__VA_ARGS__},
+#define CONTENT(lengthRoutine, readRoutine, found, marks) UNPACKED marks
+#include "nodes.def"
+};
 
 constexpr Marks kParameterMarks[] = {
 #define PARAMETER(name, type, marks) {UNPACKED marks},
 #include "nodes.def"
 };
+
+// A private text becomes another one; there is nothing that a private number would become.
+constexpr ParameterType kTypes[] = {
+#define PARAMETER(name, type, marks) type,
+#include "nodes.def"
+};
+constexpr bool AreNumbersPublic() {
+  for (size_t i = 0; i < sizeof(kTypes) / sizeof(kTypes[0]); ++i) {
+    const MarkRule<Privacy> &privacy = kParameterMarks[i].privacy;
+    const bool isPublic = privacy.routine == nullptr && privacy.mark == kPublic;
+    if (kTypes[i] == kInteger && !isPublic) return false;
+  }
+  return true;
+}
+static_assert(AreNumbersPublic());
 
 }  // namespace
 
@@ -49,6 +69,10 @@ const Marks &MarksOfField(const NodeInfo &node, size_t field) {
 
 const Marks &MarksOfOtherBytes(const NodeInfo &node) {
   return kOtherMarks[IndexOf(node)];
+}
+
+const Marks &MarksOfContent(const NodeInfo &node) {
+  return kContentMarks[IndexOf(node)];
 }
 
 const Marks &MarksOfParameter(const NodeInfo &node, size_t parameter) {

@@ -8,7 +8,7 @@
 //   becomes a numbered one of its kind, "address-3", the same everywhere in a recording. As a
 //   parameter it still tells its instance from the others;
 // - any other text (values, options, arguments) and any content: kPrivate, or nothing at all. It
-//   becomes "…"; a parameter becomes a numbered name;
+//   becomes "…"; a parameter becomes a numbered name. Parameters that are numbers are kPublic;
 // - numbers and bytes that are private (a serial number): kPrivate. They become zeros, and of a
 //   record that begins with `known` the field's bit is cleared;
 // - the bytes of a record that no field names: nothing, and they become zeros. kWithheld where the
@@ -73,7 +73,8 @@ struct Marks {
 };
 
 // Of a field of a node's record, by its place among the node's fields; of the bytes of its records
-// that no field names, or of its contents; and of one of its parameters.
+// that no field names; of its contents; and of one of its parameters.
 const Marks &MarksOfField(const NodeInfo &node, size_t field);
 const Marks &MarksOfOtherBytes(const NodeInfo &node);
+const Marks &MarksOfContent(const NodeInfo &node);
 const Marks &MarksOfParameter(const NodeInfo &node, size_t parameter);

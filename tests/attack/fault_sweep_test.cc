@@ -87,7 +87,7 @@ TEST_F(FaultSweep, Kifcache) {
   const std::string text = WriteFile("text", whole_);
   const std::string file = Scratch() + "/made.kif";
   for (const std::string &line :
-       {"record " + file, "record --redact " + file, "check " + host_, "dump " + host_,
+       {"record " + file, "redact " + host_ + " " + file, "check " + host_, "dump " + host_,
         "dump --json " + host_, "build " + text + " " + file, std::string("nodes")}) {
     Sweep("operations", Command{line}.After({BIN_DIR "/kifcache"}), host_);
     Sweep("allocations", Command{line}.After({BIN_DIR "/kifcache"}), host_);

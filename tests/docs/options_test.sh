@@ -103,6 +103,11 @@ check_kifcache() {
   completed=$(completed kifcache '')
   for command in $commands; do completed+=" $(completed kifcache "$command" - | tr -d =)"; done
   same kifcache usage "$words" completion "$completed"
+  # What stays in a redacted recording is listed in full.
+  sed -n '/^constexpr std::string_view k\(Everywhere\|BootOptions\)/,/;$/p' \
+    "$top/apps/kifcache/redact_text.cc" | grep -o '"[^"]*"' | grep -o '[^" ]*' >stays
+  sed -n '/^\.Sh WHAT STAYS/,/^\.El/p' "$page" | tr -d '\134' | tr -s ' ,;' '\n' >listed
+  ! grep -vxFf listed stays || status=1
 }
 
 # shellcheck source=/dev/null
