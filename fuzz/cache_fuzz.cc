@@ -1,5 +1,5 @@
-// Any bytes as a cache file: opened, served, checked, shown in both forms, redacted. What `kifcache check`
-// calls whole, every answer of which was visited, must also be shown to its end.
+// Any bytes as a cache file: opened, served, checked, shown in both forms, redacted. What `kifcache
+// check` calls whole, every answer of which was visited, must also be shown to its end.
 #include "cache_file.h"
 #include "check.h"
 #include "file_model.h"

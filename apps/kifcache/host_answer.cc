@@ -122,7 +122,10 @@ KIF_ParamList *Asker::Select(const Values &instance) {
 
 void Asker::Ask(const Question &question, HostAnswer *answer) {
   const NodeInfo &node = kNodes[question.node];
-  *answer = {};
+  answer->entries.clear();
+  answer->record.clear();
+  answer->content = {};
+  answer->omitted = 0;
   if (question.kind == AnswerKind::kList) {
     return AskForList(node, Select(question.instance), answer);
   }

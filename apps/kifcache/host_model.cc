@@ -5,6 +5,13 @@
 
 #include "description_text.h"
 
+std::string_view WithoutZeros(std::string_view record) {
+  // Most of a record is zeros.
+  static constexpr char kZeros[64] = {};
+  while (record.ends_with({kZeros, sizeof(kZeros)})) record.remove_suffix(sizeof(kZeros));
+  return record.substr(0, record.find_last_not_of('\0') + 1);
+}
+
 // Once the model is too large nothing more is added to it; its size then says so.
 uint32_t HostModel::AddBytes(std::string_view bytes) {
   size_ += bytes.size();
@@ -49,7 +56,7 @@ void HostModel::AddList(NodeModel *node, const Values &parent, KIF_Status status
 void HostModel::AddRecord(NodeModel *node, const Values &instance, KIF_Status status,
                           std::string_view record, uint32_t line) {
   size_ += sizeof(cache::Record);
-  record = record.substr(0, record.find_last_not_of('\0') + 1);
+  record = WithoutZeros(record);
   const cache::Selector selector = AddParameters(instance);
   const uint32_t place = AddBytes(record);
   if (size_ > kMostModelSize) return;
@@ -68,7 +75,7 @@ void HostModel::AddContent(NodeModel *node, const Values &instance, const Conten
 }
 
 void HostModel::ReplaceRecord(cache::Record *record, std::string_view bytes) {
-  bytes = bytes.substr(0, bytes.find_last_not_of('\0') + 1);
+  bytes = WithoutZeros(bytes);
   const auto length = static_cast<uint32_t>(bytes.size());
   *record = {record->selector(), record->status(), AddBytes(bytes), length};
 }

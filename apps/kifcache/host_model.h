@@ -99,6 +99,9 @@ inline std::string ReasonText(cache::Reason reason) {
   return number < std::size(kReasons) ? kReasons[number] : std::to_string(number);
 }
 
+// A record without the zeros at its end.
+std::string_view WithoutZeros(std::string_view record);
+
 // An answer of a node: its places are those of the model's own parameters and bytes. `line` is
 // where the text form gave it.
 template <typename Answer>

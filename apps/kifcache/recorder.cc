@@ -169,13 +169,15 @@ void Recorder::TellLacks() {
 }
 
 void Recorder::RecordAnswer(const Question &question, HostAnswer *answer) {
-  *answer = {};
-  answer->status = KIF_STATUS_NOT_FOUND;
   const NodeInfo &node = kNodes[question.node];
-  if (!HasRoom(node)) return;
+  if (!HasRoom(node)) {
+    *answer = {};
+    answer->status = KIF_STATUS_NOT_FOUND;
+    return;
+  }
   asker_.Ask(question, answer);
   // A tree of files may name a process twice.
-  if (EntriesSelect(node)) DropRepeated(&answer->entries);
+  if (question.kind == AnswerKind::kList && EntriesSelect(node)) DropRepeated(&answer->entries);
   Store(question, *answer);
 }
 

@@ -118,6 +118,7 @@ void Redactor::NotePrograms() {
   const auto names = model_->nodes.find(kNodes[kNode_world_name].path);
   if (names == model_->nodes.end()) return;
   for (const auto &[record, line] : names->second.records) {
+    if (record.status() != 0) continue;
     const std::string_view name = model_->TextAt(record.place(), record.length());
     const int64_t world = model_->ParametersAt(record.selector().first())->value();
     programs_[world] = name.substr(0, name.find('\0'));
@@ -169,7 +170,7 @@ void Redactor::Redact(const NodeInfo &node, cache::Record *record) {
     redacted.replace(field.offset, field.size, field.size, '\0');
     PutField(node, i, answer, &redacted);
   }
-  if (replaces_) model_->ReplaceRecord(record, redacted);
+  if (replaces_ && WithoutZeros(redacted) != bytes) model_->ReplaceRecord(record, redacted);
 }
 
 void Redactor::Redact(const NodeInfo &node, cache::Stored *content) {
