@@ -3,7 +3,7 @@
 //
 // Of a new row, mark
 // - numbers, and texts that the kernel or a driver chose from words of its own: kPublic. They stay
-//   in a redacted recording as they are, and kifcache(1) has to name the texts among them;
+//   in a redacted recording as they are, and kifcache(1) lists the texts among them;
 // - a text that names a thing which another answer may name, too: by what it names. Each such name
 //   becomes a numbered one of its kind, "address-3", the same everywhere in a recording. As a
 //   parameter it still tells its instance from the others;
