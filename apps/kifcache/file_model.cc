@@ -20,7 +20,9 @@ class Reader : public Visitor {
 
   void OnHost(const Facts &facts) override {
     model_->facts = facts;
+    // The nodes get this catalogue's descriptions.
     model_->facts.minorVersion = kCacheMinorVersion;
+    model_->facts.catalogue = CatalogueHash();
   }
   void OnNode(const VisitedNode &node) override {
     known_ = FindNodeByPath(node.path, strlen(node.path));
