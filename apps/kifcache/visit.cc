@@ -27,27 +27,30 @@ Struct At(const flatbuffers::Vector<const Struct *> &all, uint32_t place) {
   return copy;
 }
 
-bool AddMoments(const CacheFile &file, Facts *facts) {
-  const auto *all = file.content->recording()->moments();
-  if (all != nullptr && all->size() > kMostFacts) return false;
-  for (uint32_t i = 0; all != nullptr && i < all->size(); ++i) {
-    const cache::Moments of = At(*all, i);
-    std::string name;
-    if (!TextAt(file, of.name(), &name)) return false;
-    facts->moments.push_back(
-        {name, of.begin(), of.end(), of.begin_since_boot(), of.end_since_boot()});
-  }
-  return true;
+const cache::Bytes &NameOf(const cache::Moments &of) {
+  return of.name();
+}
+const cache::Bytes &NameOf(const cache::Lack &lack) {
+  return lack.what();
 }
 
-bool AddLacks(const CacheFile &file, Facts *facts) {
-  const auto *all = file.content->recording()->lacks();
+Moments FactOf(const std::string &name, const cache::Moments &of) {
+  return {name, of.begin(), of.end(), of.begin_since_boot(), of.end_since_boot()};
+}
+
+Lack FactOf(const std::string &what, const cache::Lack &lack) {
+  return {what, lack.reason(), lack.status(), lack.count()};
+}
+
+template <typename Struct, typename Fact>
+bool AddAll(const CacheFile &file, const flatbuffers::Vector<const Struct *> *all,
+            std::vector<Fact> *facts) {
   if (all != nullptr && all->size() > kMostFacts) return false;
   for (uint32_t i = 0; all != nullptr && i < all->size(); ++i) {
-    const cache::Lack lack = At(*all, i);
-    std::string what;
-    if (!TextAt(file, lack.what(), &what)) return false;
-    facts->lacks.push_back({what, lack.reason(), lack.status(), lack.count()});
+    const Struct fact = At(*all, i);
+    std::string name;
+    if (!TextAt(file, NameOf(fact), &name)) return false;
+    facts->push_back(FactOf(name, fact));
   }
   return true;
 }
@@ -237,7 +240,9 @@ bool StandOnce(const Values &entries) {
 
 bool VisitAll(const CacheFile &file, Visitor *visitor, std::string *problem) {
   Facts facts = FactsOf(file);
-  if (!AddMoments(file, &facts) || !AddLacks(file, &facts) || !AddOmitted(file, &facts)) {
+  const cache::Recording &recording = *file.content->recording();
+  if (!AddAll(file, recording.moments(), &facts.moments) ||
+      !AddAll(file, recording.lacks(), &facts.lacks) || !AddOmitted(file, &facts)) {
     *problem = "the recording";
     return false;
   }
