@@ -2,6 +2,7 @@
 #include "kiftools.h"
 
 #include <fcntl.h>
+#include <inttypes.h>
 #include <stdarg.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -38,7 +39,7 @@ constexpr Tool ToolTable[] = {
 __attribute__((format(printf, 1, 0))) void WriteMessage(const char *format, va_list arguments) {
   char message[1024];
   vsnprintf(message, sizeof(message), format, arguments);
-  fputs(message, stderr);
+  fputs(message, Messages());
 }
 
 // As POSIX basename, but leaves the path alone: it is printed later as typed.
@@ -51,7 +52,7 @@ std::string_view FinalComponent(const char *path) {
 }
 
 void PrintToolNames() {
-  for (const Tool &tool : ToolTable) fprintf(stderr, "   %s\n", tool.name);
+  for (const Tool &tool : ToolTable) fprintf(Messages(), "   %s\n", tool.name);
 }
 
 // A descriptor that a library opens must not take the place of a closed standard stream: what is
@@ -71,7 +72,7 @@ bool IsCacheOption(const char *argument) {
 void CheckHost(int argc, char **argv) {
   if (HostType_OSIsZLK() || HostType_OSIsSimulator()) return;
   if (argc < 4) {
-    fputs("usage: zlkkiftools -c cache function\n  available functions:\n", stderr);
+    fputs("usage: zlkkiftools -c cache function\n  available functions:\n", Messages());
     PrintToolNames();
     exit(1);
   }
@@ -83,7 +84,7 @@ void CheckSignature() {
   const char *programBuildDate = "";
   if (KIF_CheckSig(kernelBuildDate, sizeof(kernelBuildDate), &programBuildDate) == 0) return;
   kernelBuildDate[sizeof(kernelBuildDate) - 1] = '\0';
-  fprintf(stderr,
+  fprintf(Messages(),
           "error: md5 signature mismatch with running zelkernel built on %s (my build date: %s)\n",
           Shown(kernelBuildDate, stderr).text(), programBuildDate);
   exit(1);
@@ -94,7 +95,7 @@ int RunTool(int argc, char **argv) {
   for (const Tool &tool : ToolTable) {
     if (name == tool.name) return tool.entry(argc, argv);
   }
-  fprintf(stderr,
+  fprintf(Messages(),
           "usage: %s [options] [function] [arguments]\n       or [function] [arguments]\n\n"
           "Options:\n   --cache, -c    Perform the operation on a given KIF cache file\n\n"
           "Functions:\n",
@@ -121,13 +122,9 @@ void Warning(const char *format, ...) {
 }
 
 void FormatSize(uint64_t bytes, char *buffer, size_t size) {
-  if (bytes > 0xFFFFF) {
-    snprintf(buffer, size, "%dM", static_cast<int>(bytes >> 20));
-  } else if (bytes > 1023) {
-    snprintf(buffer, size, "%dK", static_cast<int>(bytes >> 10));
-  } else {
-    snprintf(buffer, size, "%dB", static_cast<int>(bytes));
-  }
+  const char unit = bytes > 0xFFFFF ? 'M' : bytes > 1023 ? 'K' : 'B';
+  const int shift = unit == 'M' ? 20 : unit == 'K' ? 10 : 0;
+  snprintf(buffer, size, "%" PRIu64 "%c", bytes >> shift, unit);
 }
 
 __attribute__((visibility("default"))) int main(int argc, char **argv) {
@@ -137,7 +134,7 @@ __attribute__((visibility("default"))) int main(int argc, char **argv) {
   if (programForm && argc >= 4 && IsCacheOption(argv[1])) {
     const KIF_Status status = KIF_UseCache(argv[2], 0);
     if (status != 0) {
-      fprintf(stderr, "Couldn't use specifed cache file %s: %s\n", Printable(argv[2]).text(),
+      fprintf(Messages(), "Couldn't use specifed cache file %s: %s\n", Printable(argv[2]).text(),
               ZLK_ReturnStatusToString(status));
       return 1;
     }

@@ -19,5 +19,6 @@ extern uint8_t InvokedWithCache;
 }
 #pragma GCC visibility pop
 
-// Renders a count of `bytes` as "%dM", "%dK" or "%dB", truncated, into `size` bytes of `buffer`.
+// Renders a count of `bytes` with the unit "M", "K" or "B", truncated, into `size` bytes of
+// `buffer`.
 void FormatSize(uint64_t bytes, char *buffer, size_t size);

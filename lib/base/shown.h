@@ -34,8 +34,8 @@ class Printable {
   char *text_;
 };
 
-// A text as it may be shown on `stream`: on a terminal its control characters are '?', elsewhere it
-// is the text itself. Lives as long as the call it is passed to:
+// A text as it may be shown on `stream`: on a terminal its control characters but tabs are
+// '?', elsewhere it is the text itself. Lives as long as the call it is passed to:
 //   printf("%-20s\n", Shown(name).text());
 class Shown {
  public:
@@ -51,7 +51,11 @@ class Shown {
  private:
   void Mask() {
     masked_ = strdup(text_);
-    if (masked_ != nullptr) MaskControls(masked_, strlen(masked_));
+    const size_t length = strlen(text_);
+    if (masked_ != nullptr) MaskControls(masked_, length);
+    for (size_t i = 0; masked_ != nullptr && i < length; ++i) {
+      if (text_[i] == '\t') masked_[i] = '\t';  // moves the cursor, and no more
+    }
     text_ = masked_ != nullptr ? masked_ : "?";
   }
 

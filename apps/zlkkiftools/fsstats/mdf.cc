@@ -37,7 +37,7 @@ int Usage() {
       "morelfsdf [filepath]\n"
       "   -h       multiple instead of blocks\n"
       "   -p       resource pool view\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -115,7 +115,8 @@ bool DiskTable(KIF_NodeId volumes, KIF_NodeId statsNode, const char *prefix, con
   ParamListHandle names;
   KIF_Status status = GetInstanceList(volumes, nullptr, &names);
   if (status != 0) {
-    fprintf(stderr, "Error fetching %sdisk list (%s)\n", prefix, ZLK_ReturnStatusToString(status));
+    fprintf(Messages(), "Error fetching %sdisk list (%s)\n", prefix,
+            ZLK_ReturnStatusToString(status));
     return false;
   }
   const int32_t count = KIF_ParamListUsedCount(names.get());
@@ -128,7 +129,7 @@ bool DiskTable(KIF_NodeId volumes, KIF_NodeId statsNode, const char *prefix, con
     if (status == 0) {
       printRow(view, Shown(name).text(), stats);
     } else {
-      fprintf(stderr, "KIF_Get error for '%s' (%s)\n", Shown(name, stderr).text(),
+      fprintf(Messages(), "KIF_Get error for '%s' (%s)\n", Shown(name, stderr).text(),
               ZLK_ReturnStatusToString(status));
     }
   }

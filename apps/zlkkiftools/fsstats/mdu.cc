@@ -61,7 +61,7 @@ int Usage() {
       "   -a       equivalent to unlimited depth\n"
       "   -s       equivalent to zero depth\n"
       "   -u       display stats for unlinked files\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -148,12 +148,12 @@ __attribute__((noinline)) Measured Measure(const Walk &walk, const char *path,
   const ParamListHandle inode = SelectInode(file.st_ino, &status);
   if (status == 0) status = ReadRecord(KIF_NODE_system_morelfs_inodes_stats, inode.get(), &stats);
   if (status != 0) {
-    fprintf(stderr, "KIF_Get error for '%s' (%s)\n", Printable(path).text(),
+    fprintf(Messages(), "KIF_Get error for '%s' (%s)\n", Printable(path).text(),
             ZLK_ReturnStatusToString(status));
     return Measured::kNothing;
   }
   if (walk.capacity == 0) {
-    fprintf(stderr, "No bucket space for '%s'\n", Printable(path).text());
+    fprintf(Messages(), "No bucket space for '%s'\n", Printable(path).text());
     return Measured::kNothing;
   }
   FillBucket(stats, bucket);
@@ -168,7 +168,7 @@ bool ReadDirectory(const char *path, Bytes *names) {
   if (directory == nullptr) return false;
   while (const struct dirent *entry = readdir(directory)) {
     if (names->Append(entry->d_name, strlen(entry->d_name) + 1)) continue;
-    fputs("unable to allocate memory for stats", stderr);
+    fputs("unable to allocate memory for stats", Messages());
     break;
   }
   closedir(directory);
@@ -194,7 +194,7 @@ void MergeBucket(const DustatsBucket &bucket, size_t capacity, Level *level) {
     return;
   }
   if (level->filled == capacity) {
-    fputs("Not enough dustats buckets\n", stderr);
+    fputs("Not enough dustats buckets\n", Messages());
     return;
   }
   level->buckets[level->filled++] = bucket;
@@ -204,7 +204,7 @@ size_t DustatsWalk(Walk *walk, const char *path, uint32_t depth, DustatsBucket *
 
 void PrintTooLong(Walk *walk, const Level &level, const char *name, size_t length) {
   walk->path[level.pathLength] = '\0';
-  fprintf(stderr, "path too long for '%s' '%s' (%zu)\n", Printable(walk->path).text(),
+  fprintf(Messages(), "path too long for '%s' '%s' (%zu)\n", Printable(walk->path).text(),
           Printable(name).text(), length);
   walk->path[level.prefix - 1] = '/';
 }
@@ -219,7 +219,7 @@ void WalkEntry(Walk *walk, const char *name, Level *level) {
   if (strcmp(name, ".") == 0 || strcmp(name, "..") == 0) return;
   const Buckets entry(static_cast<DustatsBucket *>(calloc(walk->capacity, sizeof(DustatsBucket))));
   if (entry == nullptr) {
-    fputs("unable to allocate memory for stats", stderr);
+    fputs("unable to allocate memory for stats", Messages());
     return;
   }
   memcpy(walk->path + level->prefix, name, nameLength + 1);
@@ -235,7 +235,7 @@ size_t WalkDirectory(Walk *walk, const char *path, uint32_t depth, DustatsBucket
   const bool hasSlash = length > 0 && path[length - 1] == '/';
   Level level = {length, hasSlash ? length : length + 1, depth, buckets, 1};
   if (level.prefix > kLongestPath) {
-    fprintf(stderr, "path too long for '%s' (%zu)\n", Printable(path).text(),
+    fprintf(Messages(), "path too long for '%s' (%zu)\n", Printable(path).text(),
             length > kLongestPath ? length : level.prefix);
     return 0;
   }
@@ -326,8 +326,7 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
   printf("Total unlinked files: %zu\n", total.files);
   char bytes[24];
   if (options.humanReadable) {
-    // Only the figure in bytes has room for more than 32 bits.
-    FormatSize(static_cast<uint32_t>(total.bytes), bytes, sizeof(bytes));
+    FormatSize(total.bytes, bytes, sizeof(bytes));
   } else {
     snprintf(bytes, sizeof(bytes), "%llu", static_cast<unsigned long long>(total.bytes));
   }
@@ -336,7 +335,7 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
 }
 
 int RefuseCache() {
-  fputs("Using KIF cache is unsupported\n", stderr);
+  fputs("Using KIF cache is unsupported\n", Messages());
   return 1;
 }
 

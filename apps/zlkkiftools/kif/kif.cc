@@ -3,6 +3,7 @@
 #include <stdio.h>
 
 #include "kiftools.h"
+#include "output.h"
 
 bool HostIsElsewhere() {
   return InvokedWithCache != 0 || (KIF_HostIsForeign != nullptr && KIF_HostIsForeign());
@@ -34,7 +35,7 @@ KIF_Status AppendCopy(KIF_Param *param, KIF_ParamList *list) {
 
 bool CopyParamToList(KIF_Param *param, KIF_ParamList *list) {
   const KIF_Status status = AppendCopy(param, list);
-  if (status != 0) fprintf(stderr, "Couldn't add param to list: %#x", status);
+  if (status != 0) fprintf(Messages(), "Couldn't add param to list: %#x", status);
   return status == 0;
 }
 

@@ -102,7 +102,7 @@ bool ReadModules(KIF_ParamList *modules, KIF_ParamList *selector, ModuleName *na
     ModuleRecord record;
     const KIF_Status status = ReadRecord(KIF_NODE_system_modules_general, selector, &record);
     if (status != 0) {
-      fprintf(stderr, "ListModules: error fetching module info - 0x%x\n", status);
+      fprintf(Messages(), "ListModules: error fetching module info - 0x%x\n", status);
       return false;
     }
     names->moduleID = record.moduleID;
@@ -110,7 +110,7 @@ bool ReadModules(KIF_ParamList *modules, KIF_ParamList *selector, ModuleName *na
     ++names;
   }
   if (walk.failed()) {
-    fprintf(stderr, "ListModules: error requesting module info - 0x%x\n", 0);
+    fprintf(Messages(), "ListModules: error requesting module info - 0x%x\n", 0);
     return false;
   }
   names->moduleID = kNoModule;
@@ -121,20 +121,20 @@ bool ReadModules(KIF_ParamList *modules, KIF_ParamList *selector, ModuleName *na
 ModuleNameCache ListModules() {
   ParamListHandle selector = CreateInstance();
   if (!selector) {
-    fputs("ListModules: Not enough memory\n", stderr);
+    fputs("ListModules: Not enough memory\n", Messages());
     return nullptr;
   }
   ParamListHandle modules;
   const KIF_Status status = GetInstanceList(KIF_NODE_system_modules, nullptr, &modules);
   if (status != 0) {
-    fprintf(stderr, "ListModules: error fetching zelkernel module list - 0x%x\n", status);
+    fprintf(Messages(), "ListModules: error fetching zelkernel module list - 0x%x\n", status);
     return nullptr;
   }
   const int32_t count = KIF_ParamListUsedCount(modules.get());
   const size_t elements = static_cast<size_t>(count > 0 ? count : 0) + 1;
   ModuleNameCache names(static_cast<ModuleName *>(calloc(elements, sizeof(ModuleName))));
   if (!names) {
-    fputs("ListModules: Not enough memory\n", stderr);
+    fputs("ListModules: Not enough memory\n", Messages());
     return nullptr;
   }
   if (!ReadModules(modules.get(), selector.get(), names.get())) return nullptr;
@@ -250,7 +250,7 @@ bool ReadSpaces(const Options &options, KIF_ParamList *selector, PciFunction *fu
                         &function->extendedSpace);
   }
   if (status != 0) {
-    fprintf(stderr, "ListPCI: error fetching PCI configuration space 0x%x\n", status);
+    fprintf(Messages(), "ListPCI: error fetching PCI configuration space 0x%x\n", status);
   }
   return status == 0;
 }
@@ -261,7 +261,7 @@ bool ShowFunction(Listing *listing) {
   const KIF_Status status = ReadRecord(KIF_NODE_hardware_pci_seg_bus_slot_func_pciConfigHeader,
                                        selector, &function.header);
   if (status != 0) {
-    fprintf(stderr, "ListPCI: error fetching PCI information 0x%x\n", status);
+    fprintf(Messages(), "ListPCI: error fetching PCI information 0x%x\n", status);
     return false;
   }
   if (!ReadSpaces(listing->options, selector, &function)) return false;
@@ -297,7 +297,7 @@ bool ListLevel(Listing *listing, int level, InstanceWalk *above) {
   const KIF_Status status =
       GetInstanceList(kLevels[level].node, level > 0 ? selector : nullptr, &instances);
   if (status != 0) {
-    fprintf(stderr, "ListPCI: error fetching PCI %s list 0x%x\n", kLevels[level].name, status);
+    fprintf(Messages(), "ListPCI: error fetching PCI %s list 0x%x\n", kLevels[level].name, status);
     return false;
   }
   InstanceWalk walk(instances.get(), selector);
@@ -314,7 +314,7 @@ bool ListLevel(Listing *listing, int level, InstanceWalk *above) {
 bool ListPCI(const Options &options) {
   Listing listing = {options, CreateInstance(), nullptr};
   if (!listing.selector) {
-    fputs("ListPCI: Not enough memory\n", stderr);
+    fputs("ListPCI: Not enough memory\n", Messages());
     return false;
   }
   return ListLevel(&listing, 0, nullptr);
@@ -325,7 +325,7 @@ bool ListPCI(const Options &options) {
 int LspciEntry(int argc, char **argv) {
   Options options = {};
   if (!ParseOptions(argc, argv, &options)) {
-    fputs(kUsage, stderr);
+    fputs(kUsage, Messages());
     return 1;
   }
   BuildPciTables();

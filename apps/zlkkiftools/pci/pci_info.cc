@@ -11,6 +11,7 @@
 #include "base/io.h"
 #include "kif/kif.h"
 #include "kiftools.h"
+#include "output.h"
 #include "records/pci.h"
 #include "tools.h"
 
@@ -101,7 +102,7 @@ KIF_Status AppendInstance(KIF_NodeId node, const char *level, int32_t number, bo
     if (param == nullptr || static_cast<int32_t>(KIF_ParamGetInt(param)) != number) continue;
     return CopyParamToList(param, device) ? 0 : KIF_STATUS_FAILURE;
   }
-  fprintf(stderr, "%s: invalid %s %d\n", "GetDevice", level, number);
+  fprintf(Messages(), "%s: invalid %s %d\n", "GetDevice", level, number);
   return KIF_STATUS_BAD_PARAMETER;
 }
 
@@ -109,7 +110,7 @@ KIF_Status AppendInstance(KIF_NodeId node, const char *level, int32_t number, bo
 KIF_Status GetDevice(const Address &address, ParamListHandle *device) {
   ParamListHandle list = CreateInstance();
   if (!list) {
-    fputs("Failed to allocate param list (size = 1)\n", stderr);
+    fputs("Failed to allocate param list (size = 1)\n", Messages());
     return KIF_STATUS_NO_RESOURCES;
   }
   const struct {
@@ -136,13 +137,13 @@ template <typename Record>
 bool ReadFunction(const char *routine, const Address &address, KIF_NodeId node, Record *record) {
   ParamListHandle device;
   if (GetDevice(address, &device) != 0) {
-    fprintf(stderr, "%s: invalid device: %d:%d.%d\n", routine, address.bus, address.slot,
+    fprintf(Messages(), "%s: invalid device: %d:%d.%d\n", routine, address.bus, address.slot,
             address.function);
     return false;
   }
   const KIF_Status status = ReadRecord(node, device.get(), record);
   if (status != 0) {
-    fprintf(stderr, "%s: error fetching PCI information 0x%x\n", routine, status);
+    fprintf(Messages(), "%s: error fetching PCI information 0x%x\n", routine, status);
   }
   return status == 0;
 }
@@ -184,7 +185,7 @@ int PciInfoEntry(int argc, char **argv) {
   Options options;
   const Parsed parsed = ParseOptions(argc, argv, &options);
   if (parsed != Parsed::kRun) {
-    fputs(kUsage, stderr);
+    fputs(kUsage, Messages());
     return parsed == Parsed::kHelp ? 0 : 1;
   }
   bool written = true;

@@ -78,7 +78,7 @@ class OutputFile {
 };
 
 bool FailWithErrno() {
-  perror("amldump: ");
+  fprintf(Messages(), "amldump: : %s\n", strerror(errno));
   return false;
 }
 
@@ -91,11 +91,11 @@ bool CreateFile(const TableBuffer &record, SignatureCounter *counter, OutputFile
   } else {
     snprintf(name, sizeof(name), "%.4s.aml", record.signature);
   }
-  printf("Writing file %s\n", Shown(name).text());
-  if (strchr(name, '/') != nullptr) {
-    errno = ENOENT;  // a table is no reason to leave the current directory
-    return FailWithErrno();
+  if (strchr(name, '/') != nullptr) {  // a table is no reason to leave the current directory
+    fprintf(Messages(), "amldump: the signature %.4s cannot name a file\n", Printable(name).text());
+    return false;
   }
+  printf("Writing file %s\n", Shown(name).text());
   return file->Create(name) || FailWithErrno();
 }
 
@@ -106,7 +106,7 @@ bool DumpBuffer(KIF_ParamList *table, int32_t number, SignatureCounter *counter,
   if (KIF_ParamListAddInt(table, number) != 0) return false;
   if (ReadRecord(KIF_NODE_hardware_acpi_tables_buffers, table, &record) != 0) return false;
   if (record.length > sizeof(record.data)) {
-    fprintf(stderr, "amldump: a buffer of %u bytes does not fit its record\n", record.length);
+    fprintf(Messages(), "amldump: a buffer of %u bytes does not fit its record\n", record.length);
     return false;
   }
   if (number == 0 && !CreateFile(record, counter, file)) return false;

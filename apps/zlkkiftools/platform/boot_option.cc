@@ -43,7 +43,7 @@ int Usage() {
       "  -b --bootOptionFiles          List of boot option files to boot\n"
       "  -c --bootOptionFileContent    Content of a boot option file used to boot\n"
       "  -C --bootOptionFilesContent   Content of all boot option files used to boot\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -185,7 +185,7 @@ uint32_t PrintChunk(KIF_ParamList *file, const ContentRequest &request) {
 
 bool PrintContent(const Request &request, const char *name) {
   if (InvokedWithCache != 0) {
-    fputs("Using KIF cache is unsupported\n", stderr);
+    fputs("Using KIF cache is unsupported\n", Messages());
     return false;
   }
   const ParamListHandle file = CreateInstance();
@@ -199,7 +199,11 @@ bool PrintContent(const Request &request, const char *name) {
   const uint32_t chunk = total < kLargestChunk ? total : kLargestChunk;
   for (uint64_t offset = 0; offset < total;) {
     const uint32_t length = PrintChunk(file.get(), {static_cast<uint32_t>(offset), chunk});
-    if (length == 0) return false;
+    if (length == 0) {
+      fprintf(Messages(), "bootOption: only %u of the %u bytes of %s could be read\n",
+              static_cast<uint32_t>(offset), total, Printable(name).text());
+      return false;
+    }
     offset += length;
   }
   return true;
@@ -280,7 +284,7 @@ bool PrintNamedContent(const Request &request) {
 
 int BootOptionEntry(int argc, char **argv) {
   if (argc < 2) {
-    fputs("bootOption: no option specified\n", stderr);
+    fputs("bootOption: no option specified\n", Messages());
     return Usage();
   }
   Request request;

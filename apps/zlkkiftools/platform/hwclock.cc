@@ -4,6 +4,7 @@
 
 #include "base/shown.h"
 #include "kif/kif.h"
+#include "output.h"
 #include "records/platform.h"
 #include "tools.h"
 
@@ -27,7 +28,7 @@ int Usage() {
       "\n"
       "Valid date format: MM/DD/YYYY\n"
       "Valid time format: HH:MM:SS\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -83,23 +84,25 @@ int ClockUnavailable(KIF_Status status) {
   return 1;
 }
 
+int UpdateFailed(KIF_Status status) {
+  printf("KIF_Set error: 0x%x\n", status);
+  return 1;
+}
+
 int SetClock(const ClockTime &wanted) {
   constexpr uint32_t kInputs = 6;
   const ParamListHandle input(KIF_ParamListCreate(KIF_PARAMLIST_INPUT, kInputs));
-  if (input == nullptr) return ClockUnavailable(KIF_STATUS_NO_MEMORY);
+  if (input == nullptr) return UpdateFailed(KIF_STATUS_NO_MEMORY);
   const int32_t values[kInputs] = {wanted.month, wanted.day,    wanted.year,
                                    wanted.hour,  wanted.minute, wanted.second};
   for (const int32_t value : values) {
     const KIF_Status status = KIF_ParamListAddInt(input.get(), static_cast<uint32_t>(value));
-    if (status != 0) return ClockUnavailable(status);
+    if (status != 0) return UpdateFailed(status);
   }
   uint32_t answer = 0;
   const KIF_Status status =
       KIF_Set(KIF_NODE_hardware_chipset_rtc, nullptr, input.get(), &answer, 0);
-  if (status != 0) {
-    printf("KIF_Set error: 0x%x\n", status);
-    return 1;
-  }
+  if (status != 0) return UpdateFailed(status);
   printf("Clock updated.\nTime: %.2d:%.2d:%.2d   Date: %.2d/%.2d/%.2d   UTC\n", wanted.hour,
          wanted.minute, wanted.second, wanted.month, wanted.day, wanted.year);
   return 0;

@@ -35,7 +35,7 @@ bool PrintCounts(KIF_ParamList *cookie, uint32_t numPcpus) {
   for (uint32_t pcpu = 0; pcpu < numPcpus; ++pcpu) {
     const AppendedInt appended(cookie, pcpu);
     if (appended.status() != 0) {
-      fprintf(stderr, "Couldn't add param to list: %#x", appended.status());
+      fprintf(Messages(), "Couldn't add param to list: %#x", appended.status());
       return false;
     }
     PcpuCount record = {};
@@ -53,7 +53,7 @@ bool PrintDevices(KIF_ParamList *cookie, const UsageStatus &usage) {
   const KIF_Status status =
       GetInstanceList(KIF_NODE_hardware_interrupts_cookieList_ZLKDevices, cookie, &devices);
   if (status != 0) {
-    fprintf(stderr, "InterruptInfo: error fetching interrupt device list - 0x%x\n", status);
+    fprintf(Messages(), "InterruptInfo: error fetching interrupt device list - 0x%x\n", status);
     return false;
   }
   char text[kDeviceTextSize] = "<ZLK device>";
@@ -67,7 +67,7 @@ bool PrintCookie(KIF_Param *param, KIF_ParamList *cookie, uint32_t numPcpus) {
   const auto value = static_cast<uint64_t>(KIF_ParamGetInt(param));
   UsageStatus usage = {};
   if (ReadRecord(KIF_NODE_hardware_interrupts_cookieList_UsageStatus, cookie, &usage) != 0) {
-    fprintf(stderr, "InterruptInfo: error fetching interrupt info - 0x%" PRIx64 "\n", value);
+    fprintf(Messages(), "InterruptInfo: error fetching interrupt info - 0x%" PRIx64 "\n", value);
     return false;
   }
   printf("0x%04" PRIx64 ":", value);
@@ -76,24 +76,24 @@ bool PrintCookie(KIF_Param *param, KIF_ParamList *cookie, uint32_t numPcpus) {
 
 int InterruptInfo(int argc) {
   if (argc > 1) {
-    fputs("irqinfo:      List interrupt information\n", stderr);
+    fputs("irqinfo:      List interrupt information\n", Messages());
     return 1;
   }
   const ParamListHandle selector = CreateInstance();
   if (selector == nullptr) {
-    fputs("InterruptInfo: Not enough memory\n", stderr);
+    fputs("InterruptInfo: Not enough memory\n", Messages());
     return 1;
   }
   CpuInfo cpuInfo = {};
   KIF_Status status = ReadRecord(KIF_NODE_hardware_cpu_cpuInfo, nullptr, &cpuInfo);
   if (status != 0) {
-    fprintf(stderr, "InterruptInfo: error fetching number of CPUs - 0x%x\n", status);
+    fprintf(Messages(), "InterruptInfo: error fetching number of CPUs - 0x%x\n", status);
     return 1;
   }
   ParamListHandle cookies;
   status = GetInstanceList(KIF_NODE_hardware_interrupts_cookieList, nullptr, &cookies);
   if (status != 0) {
-    fprintf(stderr, "InterruptInfo: error fetching interrupt list - 0x%x\n", status);
+    fprintf(Messages(), "InterruptInfo: error fetching interrupt list - 0x%x\n", status);
     return 1;
   }
   fputs("Cookie ", stdout);
@@ -105,7 +105,7 @@ int InterruptInfo(int argc) {
     if (!PrintCookie(walk.param(), selector.get(), cpuInfo.numPcpus)) return 1;
   }
   if (!walk.failed()) return 0;
-  fputs("InterruptInfo: error requesting interrupt info - 0x0\n", stderr);
+  fputs("InterruptInfo: error requesting interrupt info - 0x0\n", Messages());
   return 1;
 }
 

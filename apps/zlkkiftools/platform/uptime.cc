@@ -3,6 +3,7 @@
 #include <time.h>
 
 #include "kif/kif.h"
+#include "output.h"
 #include "records/platform.h"
 #include "tools.h"
 
@@ -41,16 +42,16 @@ KIF_Status ReadLoads(uint32_t (&loads)[kHistories]) {
   };
   const ParamListHandle group = CreateInstance();
   if (group == nullptr) {
-    fputs("Failed to allocate inputparam.\n", stderr);
+    fputs("Failed to allocate inputparam.\n", Messages());
     return 1;
   }
   KIF_Status status = KIF_ParamListAddInt(group.get(), 0);
-  if (status != 0) fputs("Failed to add inputparams.\n", stderr);
+  if (status != 0) fputs("Failed to add inputparams.\n", Messages());
   for (int i = 0; i < kHistories && status == 0; ++i) {
     LoadHistoryRecord record = {};
     status = ReadRecord(histories[i].node, group.get(), &record);
     if (status != 0) {
-      fprintf(stderr, "Failed to get %d minute cpu load history.\n", histories[i].minutes);
+      fprintf(Messages(), "Failed to get %d minute cpu load history.\n", histories[i].minutes);
     }
     loads[i] = record.loadInPct;
   }
@@ -67,7 +68,7 @@ KIF_Status LoadAverage() {
   PcpuRecord pcpus = {};
   KIF_Status status = ReadRecord(KIF_NODE_sched_globalStats_numPcpus, nullptr, &pcpus);
   if (status != 0) {
-    fputs("Failed to get number of pcups.\n", stderr);
+    fputs("Failed to get number of pcups.\n", Messages());
     return status;
   }
   uint32_t loads[kHistories] = {};
@@ -85,7 +86,7 @@ int UptimeEntry(int, char **) {
   UptimeRecord uptime = {};
   const KIF_Status status = ReadRecord(KIF_NODE_system_ntpclock_upTime, nullptr, &uptime);
   if (status != 0) {
-    fputs("Failed to get ntpclock_uptime.\n", stderr);
+    fputs("Failed to get ntpclock_uptime.\n", Messages());
     return static_cast<int>(status);
   }
   UptimeFormat(uptime.seconds);

@@ -15,7 +15,7 @@ int Usage() {
       "zelvar      -v, --version         Get version information for zelkernel\n"
       "            -l, --level           Get release level information\n"
       "            -h, --help            Print this menu\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -54,14 +54,14 @@ void PrintLevel(const char *product, const char *version, const char *level, con
 
 int ZelvarEntry(int argc, char **argv) {
   if (argc < 2) {
-    fputs("zelvar: no option specified\n", stderr);
+    fputs("zelvar: no option specified\n", Messages());
     return Usage();
   }
   bool wantsVersion = false;
   bool wantsLevel = false;
   if (!ParseOptions(argc, argv, &wantsVersion, &wantsLevel)) return Usage();
   if (!wantsVersion && !wantsLevel) {
-    fputs("zelvar: Invalid arguments\n", stderr);
+    fputs("zelvar: Invalid arguments\n", Messages());
     return Usage();
   }
   VersionRecord record = {};

@@ -82,13 +82,13 @@ KIF_Status PrintCartel(InstanceWalk *walk) {
 KIF_Status WalkWorldList() {
   const ParamListHandle selector = CreateInstance();
   if (selector == nullptr) {
-    fputs("WalkWorldList: Not enough memory\n", stderr);
+    fputs("WalkWorldList: Not enough memory\n", Messages());
     return 0;
   }
   ParamListHandle cartels;
   KIF_Status status = GetInstanceList(KIF_NODE_userworld_cartel, nullptr, &cartels);
   if (status != 0) {
-    fprintf(stderr, "WalkWorldList: error fetching world list 0x%x\n", status);
+    fprintf(Messages(), "WalkWorldList: error fetching world list 0x%x\n", status);
     return status;
   }
   puts("Cartel    |      World name     |        Type         |   fd   |  Description     ");

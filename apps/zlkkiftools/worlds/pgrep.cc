@@ -29,7 +29,7 @@ void PrintUsage() {
 }
 
 int RefuseWithoutPattern() {
-  fputs("pgrep: no matching criteria specified\n", stderr);
+  fputs("pgrep: no matching criteria specified\n", Messages());
   return kBadCommandLine;
 }
 
@@ -82,7 +82,7 @@ int PgrepEntry(int argc, char **argv) {
   const PatternHandle pattern = CompilePattern(argv[optind], error);
   if (pattern == nullptr) {
     if (error[0] == '\0') return kFailed;
-    fprintf(stderr, "pgrep: %s\n", error);
+    fprintf(Messages(), "pgrep: %s\n", error);
     return kBadCommandLine;
   }
   if (MatchCartels(*pattern, search.options.wholeLine, PrintIfSelected, &search) != 0) {

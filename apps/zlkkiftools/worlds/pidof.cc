@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include "kif/kif.h"
+#include "output.h"
 #include "records/worlds.h"
 #include "tools.h"
 #include "worlds/command_line.h"
@@ -69,13 +70,13 @@ bool PrintIfRunning(uint32_t cartelID, InstanceWalk *walk, KIF_ParamList *select
 int CartelList(const char *name, const Options &options) {
   const ParamListHandle selector = CreateInstance();
   if (selector == nullptr) {
-    fputs("CartelList: Not enough memory\n", stderr);
+    fputs("CartelList: Not enough memory\n", Messages());
     return 0;
   }
   ParamListHandle cartels;
   const KIF_Status status = GetInstanceList(KIF_NODE_userworld_cartel, nullptr, &cartels);
   if (status != 0) {
-    fprintf(stderr, "CartelList: error fetching cartel list 0x%x\n", status);
+    fprintf(Messages(), "CartelList: error fetching cartel list 0x%x\n", status);
     return 0;
   }
   int found = 0;
@@ -110,7 +111,7 @@ int PrintUsage() {
       "      -s   Single shot, only return one pid\n"
       "      -x   Scripts too, would also return ids of shells\n"
       "      -o   Pid to omit\n",
-      stderr);
+      Messages());
   return 1;
 }
 
@@ -126,7 +127,7 @@ int ParseOptions(int argc, char **argv, Options *options) {
         break;
       case 'o':
         if (options->omitCount == kMostOmits) {
-          fputs("Too many omits\n", stderr);
+          fputs("Too many omits\n", Messages());
           return 1;
         }
         options->omits[options->omitCount++] = ParseOmit(optarg);

@@ -36,7 +36,7 @@ void PrintUsage() {
 }
 
 void PrintStatus(KIF_Status status) {
-  fprintf(stderr, "pkill: %s\n", ZLK_ReturnStatusToString(status));
+  fprintf(Messages(), "pkill: %s\n", ZLK_ReturnStatusToString(status));
 }
 
 // The signal that `text` names, by its name or by a number that ends at the first other character;
@@ -78,7 +78,7 @@ KIF_Status SignalIfMatching(const MatchedCartel &cartel, void *context) {
   if (SignalProcess(cartelID, *static_cast<const int *>(context)) == 0) return 0;
   if (errno == ESRCH) return 0;  // it ended since the cartels were listed
   const int error = errno;
-  fprintf(stderr, "pkill: failed to kill %s (%d): %s\n", Shown(cartel.text, stderr).text(),
+  fprintf(Messages(), "pkill: failed to kill %s (%d): %s\n", Shown(cartel.text, stderr).text(),
           cartelID, strerror(error));
   return KIF_STATUS_FAILURE;
 }
@@ -87,7 +87,7 @@ bool SignalCartels(const char *patternText, bool wholeLine, int signal) {
   char error[kPatternErrorSize];
   const PatternHandle pattern = CompilePattern(patternText, error);
   if (pattern == nullptr) {
-    if (error[0] != '\0') fprintf(stderr, "pkill: %s\n", error);
+    if (error[0] != '\0') fprintf(Messages(), "pkill: %s\n", error);
     return false;
   }
   const KIF_Status status = MatchCartels(*pattern, wholeLine, SignalIfMatching, &signal);
@@ -99,11 +99,11 @@ bool SignalCartels(const char *patternText, bool wholeLine, int signal) {
 
 int PkillEntry(int argc, char **argv) {
   if (HostIsElsewhere()) {
-    fputs("Using KIF cache is unsupported\n", stderr);
+    fputs("Using KIF cache is unsupported\n", Messages());
     return 1;
   }
   if (argc < 2) {
-    fputs("pkill: No matching criteria specified\n", stderr);
+    fputs("pkill: No matching criteria specified\n", Messages());
     PrintUsage();
     return 1;
   }

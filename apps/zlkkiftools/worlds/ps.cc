@@ -1,9 +1,10 @@
 // ps: lists the worlds or cartels of the host, flat or as one tree for each userspace.
 #include <getopt.h>
 #include <stdio.h>
-#include <stdlib.h>
 
+#include "output.h"
 #include "tools.h"
+#include "worlds/id_argument.h"
 #include "worlds/ps_options.h"
 #include "worlds/ps_printer.h"
 #include "worlds/world_list.h"
@@ -58,12 +59,6 @@ PsOptions OptionsOf(int letter) {
   return PsColumnOption(letter);
 }
 
-// A number beyond 32 bits is no userspace's, and must not become another's.
-void RequestUserspace(const char *number) {
-  const unsigned long value = strtoul(number, nullptr, 10);
-  requestedUserspace = value < UINT32_MAX ? static_cast<uint32_t>(value) : UINT32_MAX;
-}
-
 // False where the command line ends the run, with `*status`.
 bool ParseOptions(int argc, char **argv, PsOptions *options, int *status) {
   int letter;
@@ -71,19 +66,19 @@ bool ParseOptions(int argc, char **argv, PsOptions *options, int *status) {
   while ((letter = getopt_long(argc, argv, kShortOptions, kLongOptions, nullptr)) != -1) {
     const PsOptions added = OptionsOf(letter);
     *options |= added;
-    if (letter == 'U' && optarg != nullptr) RequestUserspace(optarg);
+    if (letter == 'U' && optarg != nullptr) requestedUserspace = ParseId(optarg);
     if (added != 0) continue;
     if (letter == 'h' || letter == '?') {
-      fputs(kUsage, stderr);
+      fputs(kUsage, Messages());
       *status = letter == 'h' ? 0 : 1;
     } else {
-      fprintf(stderr, "ps: getopt failed? (%c)\n", letter);
+      fprintf(Messages(), "ps: getopt failed? (%c)\n", letter);
     }
     return false;
   }
   if (optind < argc) {
-    fputs("ps: no non-option arguments\n", stderr);
-    fputs(kUsage, stderr);
+    fputs("ps: no non-option arguments\n", Messages());
+    fputs(kUsage, Messages());
     return false;
   }
   return true;
@@ -96,11 +91,11 @@ int PsEntry(int argc, char **argv) {
   int status;
   if (!ParseOptions(argc, argv, &options, &status)) return status;
   if ((options & PS_NCHILDREN) != 0 && (options & PS_TREE) == 0) {
-    fputs("nChildren needs --tree\n", stderr);
+    fputs("nChildren needs --tree\n", Messages());
     return 1;
   }
   if ((options & PS_NTHREADS) != 0 && (options & PS_TREE) == 0) {
-    fputs("nThreads needs --tree\n", stderr);
+    fputs("nThreads needs --tree\n", Messages());
     return 1;
   }
   return WorldList(options) ? 0 : 1;

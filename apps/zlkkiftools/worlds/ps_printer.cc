@@ -250,13 +250,19 @@ void PsPrinter::PrintState(const WorldRecord &record) const {
   printf("  %-6.6s  %-6.6s  %-4s", run, wait, Shown(texts_.At(record.cpuText)).text());
 }
 
+bool PsPrinter::ReserveBranches(const WorldInventory &inventory) {
+  size_t parents = 0;
+  for (size_t i = 0; i < inventory.allCount; ++i) parents += inventory.all[i]->nChildren != 0;
+  if (branches_.Reserve(parents * std::string_view(kVerticalLine).size())) return true;
+  fputs("WorldList: Not enough memory\n", Messages());
+  return false;
+}
+
 // Below a record with a later sibling a line goes on down to that sibling. The root has none, and
 // what stands below it is only moved to the right.
-bool PsPrinter::PushBranch(const WorldRecord &record) {
+void PsPrinter::PushBranch(const WorldRecord &record) {
   const std::string_view branch = BranchBelow(record);
-  if (branches_.Append(branch.data(), branch.size())) return true;
-  fputs("WorldList: Not enough memory\n", stderr);
-  return false;
+  (void)branches_.Append(branch.data(), branch.size());  // there is room
 }
 
 void PsPrinter::PopBranch(const WorldRecord &record) {
@@ -264,7 +270,7 @@ void PsPrinter::PopBranch(const WorldRecord &record) {
 }
 
 // Walks by the records' links, so that the depth of a tree costs no stack.
-bool PsPrinter::PrintTree(const WorldRecord &root) {
+void PsPrinter::PrintTree(const WorldRecord &root) {
   int32_t level = 0;
   printf("%d\n", static_cast<int32_t>(root.userspaceID));
   for (const WorldRecord *record = &root; record != nullptr;) {
@@ -273,7 +279,7 @@ bool PsPrinter::PrintTree(const WorldRecord &root) {
     fputs(record->nextSibling != nullptr ? kBranch : kCorner, stdout);
     PrintRow(*record);
     if (record->firstChild != nullptr) {
-      if (!PushBranch(*record)) return false;
+      PushBranch(*record);
       ++level;
       record = record->firstChild;
       continue;
@@ -285,5 +291,4 @@ bool PsPrinter::PrintTree(const WorldRecord &root) {
     }
     record = record->nextSibling;
   }
-  return true;
 }

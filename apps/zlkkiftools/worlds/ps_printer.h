@@ -19,6 +19,10 @@ class PsPrinter {
   // `texts` are those of the records printed, and outlive the printer.
   PsPrinter(PsOptions options, const WorldTexts &texts);
 
+  // Makes room for the branches of the deepest tree that the linked inventory can have; to be
+  // called before a tree is printed. False, after a message, without memory.
+  bool ReserveBranches(const WorldInventory &inventory);
+
   // One line of column titles.
   void PrintHeader() const;
 
@@ -26,14 +30,14 @@ class PsPrinter {
   void PrintRow(const WorldRecord &record) const;
 
   // A userspace's number, its root and everything linked below it. A root hangs under nothing.
-  // Raises deepestLevel. False, after a message, without memory for the branches of a deep tree.
-  bool PrintTree(const WorldRecord &root);
+  // Raises deepestLevel.
+  void PrintTree(const WorldRecord &root);
 
  private:
   void PrintCell(const PsColumn &column, const WorldRecord &record) const;
   void PrintType(uint32_t worldType) const;
   void PrintState(const WorldRecord &record) const;
-  bool PushBranch(const WorldRecord &record);
+  void PushBranch(const WorldRecord &record);
   void PopBranch(const WorldRecord &record);
 
   bool Has(PsOptions option) const { return (options_ & option) != 0; }

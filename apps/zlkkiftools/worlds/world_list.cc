@@ -4,6 +4,7 @@
 
 #include <algorithm>
 
+#include "output.h"
 #include "records/worlds.h"
 #include "worlds/ps_printer.h"
 #include "worlds/world_reader.h"
@@ -33,7 +34,7 @@ struct WorldPlace {
 void RegisterRoot(WorldRecord *record, UserspaceTable *table) {
   if (!IsUserspaceRoot(*record)) return;
   if (record->userspaceID > kHighestUserspace) {
-    fputs("Warning: maximum number of userspaces reached...\n", stderr);
+    fputs("Warning: maximum number of userspaces reached...\n", Messages());
   } else {
     table->roots[record->userspaceID - 1] = record;
   }
@@ -43,7 +44,7 @@ bool BuildInventory(WorldInventory *inventory, UserspaceTable *table) {
   const size_t count = inventory->worldCount + inventory->zombies.size();
   inventory->all.reset(static_cast<WorldRecord **>(calloc(count + 1, sizeof(void *))));
   if (inventory->all == nullptr) {
-    fputs("WorldList: malloc failed when allocating allNodes list\n", stderr);
+    fputs("WorldList: malloc failed when allocating allNodes list\n", Messages());
     return false;
   }
   for (size_t i = 0; i < inventory->worldCount; ++i) {
@@ -62,14 +63,14 @@ bool IsRunning(const UserspaceTable &table, uint32_t userspace) {
 }
 
 void ReportNotRunning(const UserspaceTable &table) {
-  fprintf(stderr, "Requested userspace (%d) is not running.\nAvailable userspaces:\n ",
+  fprintf(Messages(), "Requested userspace (%d) is not running.\nAvailable userspaces:\n ",
           static_cast<int>(requestedUserspace));
   for (uint32_t i = 0; i < kUserspaces; ++i) {
     if (table.roots[i] == nullptr) continue;
-    fprintf(stderr, "%3u ", i + 1);
-    if (i != 0 && i % 10 == 0) fputc('\n', stderr);
+    fprintf(Messages(), "%3u ", i + 1);
+    if (i != 0 && i % 10 == 0) fputc('\n', Messages());
   }
-  fputc('\n', stderr);
+  fputc('\n', Messages());
 }
 
 void LinkUnder(WorldRecord *parent, WorldRecord *record) {
@@ -103,7 +104,7 @@ bool LinkTree(WorldInventory *inventory) {
   const std::unique_ptr<WorldPlace[], FreeDeleter> places(
       static_cast<WorldPlace *>(calloc(inventory->allCount + 1, sizeof(WorldPlace))));
   if (places == nullptr) {
-    fputs("WorldList: malloc failed when allocating allNodes list\n", stderr);
+    fputs("WorldList: malloc failed when allocating allNodes list\n", Messages());
     return false;
   }
   const WorldPlace *end = places.get() + SortById(*inventory, places.get());
@@ -122,12 +123,13 @@ bool LinkTree(WorldInventory *inventory) {
 
 bool PrintTrees(PsOptions options, const WorldInventory &inventory, const UserspaceTable &table) {
   PsPrinter printer(options, inventory.texts);
+  if (!printer.ReserveBranches(inventory)) return false;
   printf("%c)0\n", 27);
   for (uint32_t i = 0; i < kUserspaces; ++i) {
     if (table.roots[i] == nullptr) continue;
     if (requestedUserspace != 0 && i != requestedUserspace - 1) continue;
     printer.PrintHeader();
-    if (!printer.PrintTree(*table.roots[i])) return false;
+    printer.PrintTree(*table.roots[i]);
     putchar('\n');
   }
   return true;

@@ -4,6 +4,7 @@
 #include <string.h>
 
 #include "kif/kif.h"
+#include "output.h"
 #include "records/worlds.h"
 
 namespace {
@@ -20,7 +21,7 @@ struct Reader {
 };
 
 bool NoMemory() {
-  fputs("WorldList: Not enough memory\n", stderr);
+  fputs("WorldList: Not enough memory\n", Messages());
   return false;
 }
 
@@ -58,12 +59,12 @@ Reading ReadSchedStats(KIF_ParamList *instance, SchedAffinity *affinity, WorldRe
 bool FetchChildren(uint32_t cartelID, ParamListHandle *children) {
   const ParamListHandle parent = CreateInstance();
   if (parent == nullptr) {
-    fputs("failed to alloc paramlist for children\n", stderr);
+    fputs("failed to alloc paramlist for children\n", Messages());
     return false;
   }
   const AppendedInt cartel(parent.get(), cartelID);
   if (cartel.status() != 0) {
-    fputs("failed to add int to child param list\n", stderr);
+    fputs("failed to add int to child param list\n", Messages());
     return false;
   }
   // A cartel whose children cannot be listed has none to show.
@@ -74,20 +75,20 @@ bool FetchChildren(uint32_t cartelID, ParamListHandle *children) {
 bool ReadChild(uint32_t cartelID, int32_t childID, ChildRecord *child) {
   const ParamListHandle instance = CreateInstance();
   if (instance == nullptr) {
-    fputs("failed to create children list\n", stderr);
+    fputs("failed to create children list\n", Messages());
     return false;
   }
   if (KIF_ParamListAddInt(instance.get(), cartelID) != 0) {
-    fputs("failed to add cartel ID to list\n", stderr);
+    fputs("failed to add cartel ID to list\n", Messages());
     return false;
   }
   if (KIF_ParamListAddInt(instance.get(), childID) != 0) {
-    fputs("failed to add child ID to list\n", stderr);
+    fputs("failed to add child ID to list\n", Messages());
     return false;
   }
   const KIF_Status status = ReadRecord(KIF_NODE_userworld_cartel_child, instance.get(), child);
   if (status != 0) {
-    fprintf(stderr, "failed to get child info for child %d, status %s\n", childID,
+    fprintf(Messages(), "failed to get child info for child %d, status %s\n", childID,
             ZLK_ReturnStatusToString(status));
   }
   return status == 0;
@@ -110,14 +111,14 @@ bool CollectZombies(WorldInventory *inventory, WorldRecord *record) {
   if (!FetchChildren(record->cartelID, &children)) return false;
   const int32_t count = children != nullptr ? KIF_ParamListUsedCount(children.get()) : 0;
   if (count > 0 && !inventory->zombies.Reserve(static_cast<size_t>(count))) {
-    fputs("failed to allocate array for zombies\n", stderr);
+    fputs("failed to allocate array for zombies\n", Messages());
     return false;
   }
   record->zombies = inventory->zombies.size();
   for (int32_t i = 0; i < count; ++i) {
     int32_t childID;
     if (KIF_ParamListGetInt32(children.get(), static_cast<uint32_t>(i), &childID) != 0) {
-      fputs("failed to get child ID\n", stderr);
+      fputs("failed to get child ID\n", Messages());
       return false;
     }
     ChildRecord child;
@@ -200,7 +201,7 @@ bool ReadWorlds(PsOptions options, WorldInventory *inventory, uint32_t *total) {
       GetInstanceList((options & PS_CARTELS_ONLY) != 0 ? KIF_NODE_userworld_cartel : KIF_NODE_world,
                       nullptr, &worlds);
   if (status != 0) {
-    fprintf(stderr, "WorldList: error fetching world list 0x%x\n", status);
+    fprintf(Messages(), "WorldList: error fetching world list 0x%x\n", status);
     return false;
   }
   InstanceWalk walk(worlds.get(), instance.get());
@@ -208,7 +209,7 @@ bool ReadWorlds(PsOptions options, WorldInventory *inventory, uint32_t *total) {
   inventory->worlds.reset(
       static_cast<WorldRecord *>(calloc(size_t{*total} + 1, sizeof(WorldRecord))));
   if (inventory->worlds == nullptr) {
-    fputs("WorldList: malloc failed when allocating root tree node\n", stderr);
+    fputs("WorldList: malloc failed when allocating root tree node\n", Messages());
     return false;
   }
   Reader reader = {options, inventory};
