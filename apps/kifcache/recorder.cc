@@ -26,8 +26,21 @@ Values Joined(const Values &values, Value last) {
   return joined;
 }
 
+// How many parameters of a node the list has given that it stands below.
+size_t CountOfParents(const NodeInfo &node) {
+  return node.hasLists ? CountOfListParameters(node) : node.parameterCount;
+}
+
+// Whether a node lists just what another one stands below.
+bool ListsParentsOf(const NodeInfo &node, const NodeInfo &list) {
+  const size_t count = CountOfParents(node);
+  return list.hasLists && list.parameterCount == count &&
+         std::equal(node.parameters, node.parameters + count, list.parameters);
+}
+
 // The list node whose instances a node stands below: the one with the longest path that begins the
-// node's; kNodeCount where there is none.
+// node's, else the first that lists what the node's parameters select; kNodeCount where there is
+// none.
 NodeIndex ListAbove(const NodeInfo &node) {
   NodeIndex above = kNodeCount;
   size_t longest = 0;
@@ -39,7 +52,18 @@ NodeIndex ListAbove(const NodeInfo &node) {
       above = IndexOf(candidate);
     }
   }
-  return above;
+  if (above != kNodeCount || node.hasVariable) return above;
+  const NodeInfo *list = std::find_if(kNodes, kNodes + kNodeCount, [&node](const NodeInfo &other) {
+    return ListsParentsOf(node, other);
+  });
+  return static_cast<NodeIndex>(list - kNodes);
+}
+
+// Whether other nodes stand below the instances of a node.
+bool IsAboveOthers(NodeIndex list) {
+  return std::any_of(kNodes, kNodes + kNodeCount, [list](const NodeInfo &node) {
+    return node.parameterCount > 0 && IndexOf(node) != list && ListAbove(node) == list;
+  });
 }
 
 // The value of an unsigned field of a record.
@@ -220,9 +244,8 @@ const std::vector<Values> &Recorder::ListInstances(NodeIndex list) {
 // The instances that a node stands below; the one without parameters at the top.
 const std::vector<Values> &Recorder::Parents(const NodeInfo &node) {
   static const std::vector<Values> top(1);
-  const size_t count = node.hasLists ? CountOfListParameters(node) : node.parameterCount;
   const NodeIndex above = ListAbove(node);
-  return count == 0 || above == kNodeCount ? top : ListInstances(above);
+  return CountOfParents(node) == 0 || above == kNodeCount ? top : ListInstances(above);
 }
 
 // A cartel's ID stands for its main world.
@@ -252,13 +275,17 @@ uint64_t Recorder::CountPcpus() {
 // Records the instances below each parent, and the record of each of them.
 void Recorder::RecordOwnLists(const NodeInfo &node) {
   const bool byPlace = node.instances == Instances::kOwnListIndex;
-  const size_t row = IndexOf(node);
+  const NodeIndex row = IndexOf(node);
+  const bool kept = !byPlace && IsAboveOthers(row);
+  walked_[row] = kept;
   for (const Values &parent : Parents(node)) {
     Values entries = RecordList(node, parent);
     if (!byPlace) DropRepeated(&entries);
     int64_t place = 0;
     for (const Value &entry : entries) {
-      RecordAnswers(row, row + 1, Joined(parent, byPlace ? IntegerValue(place++) : entry));
+      const Values instance = Joined(parent, byPlace ? IntegerValue(place++) : entry);
+      RecordAnswers(row, row + 1u, instance);
+      if (kept) instances_[row].push_back(instance);
     }
   }
 }

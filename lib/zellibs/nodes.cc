@@ -9,6 +9,7 @@
 #include "records/morelfs.h"
 #include "records/pci.h"
 #include "records/platform.h"
+#include "records/storage.h"
 #include "records/worlds.h"
 
 const char kInterfaceDate[21] = "Nov 22 2026 00:00:00";

@@ -53,20 +53,23 @@ bool ParseMount(char *line, Mount *mount) {
   if (!TakeDevice(TakeWord(&line), mount)) return false;
   char *root = TakeWord(&line);
   char *point = TakeWord(&line);
-  TakeWord(&line);  // the mount's own options
+  char *ownOptions = TakeWord(&line);
   while (*line != '\0' && strcmp(TakeWord(&line), "-") != 0) {
   }
   char *type = TakeWord(&line);
-  TakeWord(&line);  // the source
+  char *source = TakeWord(&line);
   char *options = TakeWord(&line);
   if (point[0] != '/' || type[0] == '\0') return false;
   Unescape(root);
   Unescape(point);
   Unescape(options);
+  Unescape(source);
   mount->root = root;
   mount->point = point;
   mount->type = type;
+  mount->source = source;
   mount->options = options;
+  mount->ownOptions = ownOptions;
   mount->hidden = false;
   return true;
 }

@@ -15,8 +15,10 @@ struct Mount {
   const char *root;     // what of the file system is mounted, "/" for all of it
   const char *point;    // where, absolute
   const char *type;     // "tmpfs"
+  const char *source;   // a device, a server, or what the file system calls it
   const char *options;  // of the file system as a whole
-  bool hidden;          // something else is mounted over it
+  const char *ownOptions;
+  bool hidden;  // something else is mounted over it
 };
 
 struct MountTable {
