@@ -25,8 +25,8 @@ enum class Instances : uint8_t {
   kNone,          // the record has no instance
   kGroupZero,     // the integer 0
   kWorlds,        // the entries of the lists world and userworld_cartel
-  kParent,        // the instances of the node above it: the longest list path that is a prefix, else
-                  // beyond the tools the first list of the same parameters
+  kParent,        // the instances of the node above it: the longest list path that is a prefix;
+                  // where there is none beyond the tools, the first list of the same parameters
   kParentByPcpu,  // those, each with every PCPU number from 0 (hardware_cpu_cpuInfo)
   kOwnList,       // the entries of the node's own instance lists
   kOwnListIndex,  // the places 0 to count - 1 of the node's own instance lists
