@@ -18,6 +18,11 @@ Privacy PrivacyOfDescriptor(const MarkedAnswer &answer) {
   return record.starts_with(kSocketKind) ? kSocket : kPath;
 }
 
+// Only the recorder's own network namespace has a number that is not the kernel's.
+Change ChangeOfNetwork(const MarkedAnswer &answer) {
+  return answer.instance[0].integer == 1 ? kKey : kThisBoot;
+}
+
 #define UNPACKED(...) __VA_ARGS__
 
 constexpr Marks kFieldMarks[] = {
