@@ -13,6 +13,7 @@
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/process_directory.h"
+#include "linux/socket_holders.h"
 #include "linux/sockets.h"
 #include "records/worlds.h"
 
@@ -109,7 +110,8 @@ KIF_Status NameSocket(char *text, size_t size, size_t *length) {
   const char *place = text + strlen(kSocket);
   uint64_t inode;
   if (!TakeNumber(&place, &inode)) return KIF_STATUS_OK;
-  const KIF_Status status = ReadSocketsOfKept();
+  KIF_Status status = NoteHolder(snapshot->id, inode);
+  if (status == KIF_STATUS_OK) status = ReadSocketsOfKept();
   if (status == KIF_STATUS_OK && DescribeSocket(inode, text, size)) *length = strlen(text);
   return status;
 }
@@ -118,6 +120,7 @@ KIF_Status ReadLink(const char *name, char *text, size_t size, size_t *length) {
   if (snapshot->refused) return KIF_STATUS_NO_PERMISSION;
   const KIF_Status status = ReadLinkBelow(snapshot->descriptors.fd(), name, text, size, length);
   snapshot->refused = status == KIF_STATUS_NO_PERMISSION;
+  if (snapshot->refused) NoteRefusal();
   return status;
 }
 
@@ -133,6 +136,8 @@ KIF_Status ListDescriptors(const NodeInfo &, const KIF_ParamList *parent, KIF_Pa
   const int duplicate = fcntl(descriptors.fd(), F_DUPFD_CLOEXEC, 0);
   if (duplicate < 0) return StatusOfErrno(errno);
   Keep(process, duplicate);
+  status = NoteDescriptorsOf(process);
+  if (status != KIF_STATUS_OK) return status;
   while (const char *name = descriptors.Next()) {
     uint64_t number;
     if (!TakeNumber(&name, &number) || *name != '\0' || number > INT32_MAX) continue;

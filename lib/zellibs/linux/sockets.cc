@@ -74,11 +74,20 @@ struct Socket {
   uint8_t table;  // place in kTables
 };
 
+// Where the text of a table stands.
+struct Piece {
+  uint64_t number;  // of the namespace
+  size_t begin;
+  size_t end;
+  uint8_t table;
+};
+
 // The sockets of all namespaces read so far. A process may hold sockets of other namespaces than
 // its own (a service manager passes them on), and inode numbers are unique among all of them.
 struct Sockets {
   Array<uint64_t> namespaces;  // inode numbers
   Bytes texts;                 // the tables, one behind the other
+  Array<Piece> pieces;
   Array<Socket> byInode;
 };
 
@@ -162,12 +171,6 @@ const Socket *FindSocket(uint64_t inode) {
   return found != known.end() && found->inode == inode ? found : nullptr;
 }
 
-struct Endpoint {
-  unsigned char address[16];
-  size_t size;  // of the address: 4 or 16
-  unsigned long port;
-};
-
 // "0100007F:0016": the address as words in the machine's byte order, the port as a number.
 bool ParseEndpoint(const char *field, Endpoint *endpoint) {
   constexpr size_t kWordDigits = 8;
@@ -232,6 +235,25 @@ bool FormatInternet(const Table &table, const char *line, char *text, size_t siz
   return true;
 }
 
+// "...: 0100007F:0016 00000000:0000 0A 00000000:00000001 00:00000000 00000000  1000  0 12345": the
+// queues of what is sent and received, and a few fields on user and inode number.
+bool ParseInternet(const Table &table, const char *line, InternetSocket *socket) {
+  constexpr unsigned kLocal = 1, kRemote = 2, kState = 3, kQueues = 4, kUser = 7;
+  const char *place = FieldOf(line, table.inodeField);
+  if (!TakeNumber(&place, &socket->inode) ||
+      !ParseEndpoint(FieldOf(line, kLocal), &socket->local) ||
+      !ParseEndpoint(FieldOf(line, kRemote), &socket->remote)) {
+    return false;
+  }
+  char *colon;
+  socket->protocol = table.protocol;
+  socket->state = NameOf(kTcpStates, HexadecimalField(line, kState));
+  socket->sendQueue = static_cast<uint32_t>(strtoul(FieldOf(line, kQueues), &colon, 16));
+  socket->receiveQueue = *colon == ':' ? static_cast<uint32_t>(strtoul(colon + 1, nullptr, 16)) : 0;
+  socket->user = static_cast<uint32_t>(strtoul(FieldOf(line, kUser), nullptr, 10));
+  return true;
+}
+
 // What a socket without a name is called, its inode number, is all that tells it from others.
 void FormatUnix(const Socket &socket, const char *line, char *text, size_t size) {
   char unnamed[32];
@@ -280,13 +302,18 @@ KIF_Status ReadSocketsOf(int process) {
   if (status == KIF_STATUS_NO_RESOURCES) return status;
   if (status != KIF_STATUS_OK) return KIF_STATUS_OK;
   const size_t before = snapshot->byInode.size();
+  const size_t piecesBefore = snapshot->pieces.size();
   for (uint8_t table = 0; status == KIF_STATUS_OK && table < std::size(kTables); ++table) {
+    const size_t begin = snapshot->texts.size();
     status = ReadTable(net.fd(), table);
+    const Piece piece = {number, begin, snapshot->texts.size(), table};
+    if (!snapshot->pieces.Append(piece)) status = KIF_STATUS_NO_MEMORY;
   }
   // A process that ended meanwhile showed a part of them at most; the next one is asked.
   uint64_t still;
   if (NamespaceOf(process, &still) != KIF_STATUS_OK || still != number) {
     snapshot->byInode.Truncate(before);
+    snapshot->pieces.Truncate(piecesBefore);
   } else if (!snapshot->namespaces.Append(number)) {
     status = KIF_STATUS_NO_MEMORY;
   }
@@ -316,4 +343,26 @@ bool DescribeSocket(uint64_t inode, char *text, size_t size) {
       break;
   }
   return true;
+}
+
+KIF_Status ForEachInternetSocket(int process,
+                                 KIF_Status (*give)(const InternetSocket &socket, void *context),
+                                 void *context) {
+  uint64_t number;
+  KIF_Status status = NamespaceOf(process, &number);
+  if (status == KIF_STATUS_OK) status = ReadSocketsOf(process);
+  bool isThere = false;  // a table that was read has a heading at least
+  for (const Piece &piece : snapshot->pieces) {
+    const Table &table = kTables[piece.table];
+    if (piece.number != number || table.layout != Layout::kInternet) continue;
+    isThere = isThere || piece.end > piece.begin;
+    const char *end = snapshot->texts.text() + piece.end;
+    for (const char *line = snapshot->texts.text() + piece.begin; line < end;) {
+      InternetSocket socket;
+      if (status != KIF_STATUS_OK) return status;
+      if (ParseInternet(table, line, &socket)) status = give(socket, context);
+      line += strcspn(line, "\n") + 1;
+    }
+  }
+  return status != KIF_STATUS_OK || isThere ? status : KIF_STATUS_NOT_FOUND;
 }
