@@ -123,8 +123,11 @@ KIF_Status GetSocket(const NodeInfo &, const KIF_ParamList *instance, void *reco
   snprintf(answer->state, sizeof(answer->state), "%s", socket.state != nullptr ? socket.state : "");
   PutAddress(socket.local, answer->localAddress);
   PutAddress(socket.remote, answer->remoteAddress);
-  for (unsigned field = kInode; field <= kRemoteAddress; ++field) Know(&known, field, true);
-  if (socket.state == nullptr) known &= ~(uint64_t{1} << kState);
+  for (const unsigned field : {kInode, kSendQueue, kReceiveQueue, kUser, kLocalPort, kRemotePort,
+                               kProtocol, kLocalAddress, kRemoteAddress}) {
+    Know(&known, field, true);
+  }
+  Know(&known, kState, socket.state != nullptr);
   PutHolders(socket.inode, answer, &known);
   answer->known = known;
   return KIF_STATUS_OK;
