@@ -11,6 +11,7 @@
 #include "records/pci.h"
 #include "records/platform.h"
 #include "records/storage.h"
+#include "records/system.h"
 #include "records/worlds.h"
 
 const char kInterfaceDate[21] = "Nov 22 2026 00:00:00";

@@ -34,3 +34,11 @@ void PutNumber(uint64_t *known, unsigned field, bool is, uint64_t number, Number
   *place = static_cast<Number>(number);
   Know(known, field, true);
 }
+
+// The same for a field of a packed record, which no pointer may lead to: the number, or 0.
+template <typename Number>
+Number KnownNumber(uint64_t *known, unsigned field, bool is, uint64_t number) {
+  Number kept = 0;
+  PutNumber(known, field, is, number, &kept);
+  return kept;
+}
