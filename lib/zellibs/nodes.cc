@@ -8,6 +8,7 @@
 #include "records/cartels.h"
 #include "records/morelfs.h"
 #include "records/network.h"
+#include "records/packages.h"
 #include "records/pci.h"
 #include "records/platform.h"
 #include "records/storage.h"
