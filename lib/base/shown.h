@@ -39,14 +39,17 @@ class Printable {
 //   printf("%-20s\n", Shown(name).text());
 class Shown {
  public:
-  explicit Shown(const char *text, FILE *stream = stdout) : text_(text) {
-    if (IsTerminal(stream)) Mask();
-  }
+  explicit Shown(const char *text, FILE *stream = stdout) : Shown(text, IsTerminal(stream)) {}
   ~Shown() { free(masked_); }
   Shown(const Shown &) = delete;
   Shown &operator=(const Shown &) = delete;
 
   const char *text() const { return text_; }
+
+ protected:
+  Shown(const char *text, bool masked) : text_(text) {
+    if (masked) Mask();
+  }
 
  private:
   void Mask() {
@@ -61,4 +64,12 @@ class Shown {
 
   char *masked_ = nullptr;
   const char *text_;
+};
+
+// The same for the name of a file or folder, which a host hands out as it is, for it selects: where
+// it has a line end it is masked everywhere, lest it forge a row.
+class ShownName : public Shown {
+ public:
+  explicit ShownName(const char *name, FILE *stream = stdout)
+      : Shown(name, IsTerminal(stream) || strchr(name, '\n') != nullptr) {}
 };

@@ -127,9 +127,9 @@ bool DiskTable(KIF_NodeId volumes, KIF_NodeId statsNode, const char *prefix, con
     status = ReadRecordOf(statsNode, name, &stats);
     if (name == nullptr) name = "";
     if (status == 0) {
-      printRow(view, Shown(name).text(), stats);
+      printRow(view, ShownName(name).text(), stats);
     } else {
-      fprintf(Messages(), "KIF_Get error for '%s' (%s)\n", Shown(name, stderr).text(),
+      fprintf(Messages(), "KIF_Get error for '%s' (%s)\n", ShownName(name, stderr).text(),
               ZLK_ReturnStatusToString(status));
     }
   }

@@ -283,6 +283,7 @@ int ReportTree(const Options &options, const char *path) {
 struct UnlinkedTotal {
   size_t files = 0;
   uint64_t bytes = 0;
+  bool refused = false;  // something may not be seen
 };
 
 void CountUnlinked(const Options &options, InodeStats *stats, UnlinkedTotal *total) {
@@ -309,6 +310,7 @@ KIF_Status ListUnlinked(const Options &options, KIF_ParamList *inodes, UnlinkedT
     InodeStats stats = {};
     status = ReadRecord(KIF_NODE_system_morelfs_inodes_stats, inode.get(), &stats);
     if (status == 0) CountUnlinked(options, &stats, total);
+    if (status == KIF_STATUS_NO_PERMISSION) total->refused = true;
   }
   return status;
 }
@@ -319,8 +321,12 @@ KIF_Status UnlinkedFilesReport(const Options &options) {
   if (status != 0) return status;
   UnlinkedTotal total;
   status = ListUnlinked(options, inodes.get(), &total);
+  if (total.refused) {
+    fputs("mdu: not every process may be looked into: there may be more unlinked files\n",
+          Messages());
+  }
   if (total.files == 0) {
-    puts("No unlinked files.");
+    if (!total.refused) puts("No unlinked files.");
     return status;
   }
   printf("Total unlinked files: %zu\n", total.files);

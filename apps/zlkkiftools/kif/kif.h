@@ -14,6 +14,7 @@
 // Statuses that the program names itself.
 #define KIF_STATUS_FAILURE 0xbad0001u
 #define KIF_STATUS_BAD_PARAMETER 0xbad0007u
+#define KIF_STATUS_NO_PERMISSION 0xbad000fu
 #define KIF_STATUS_NO_MEMORY 0xbad0014u
 #define KIF_STATUS_NO_RESOURCES 0xbad0017u
 #define KIF_STATUS_NO_COMMAND_LINE 0xbad0062u

@@ -195,7 +195,7 @@ bool PrintContent(const Request &request, const char *name) {
     printf("Invalid boot option file name %s\n", Printable(name).text());
     return false;
   }
-  if (!request.raw) printf("Boot Option File Content %s : ", Shown(name).text());
+  if (!request.raw) printf("Boot Option File Content %s : ", ShownName(name).text());
   const uint32_t chunk = total < kLargestChunk ? total : kLargestChunk;
   for (uint64_t offset = 0; offset < total;) {
     const uint32_t length = PrintChunk(file.get(), {static_cast<uint32_t>(offset), chunk});
@@ -254,7 +254,7 @@ bool PrintModules(const Request &request) {
     if (name == nullptr) return false;
     TardiskStats stats = {};
     if (ReadRecordOf(KIF_NODE_system_morelfs_tardisks_stats, name, &stats) != 0) return false;
-    if (static_cast<uint8_t>(stats.usedToBoot) != 0) printf("%s ", Shown(name).text());
+    if (static_cast<uint8_t>(stats.usedToBoot) != 0) printf("%s ", ShownName(name).text());
   }
   putchar('\n');
   return true;
@@ -268,7 +268,7 @@ bool PrintFiles(const Request &request) {
   for (int32_t i = 0; i < count; ++i) {
     const char *name = NameAt(files.get(), i);
     if (name == nullptr) return false;
-    printf("%s ", Shown(name).text());
+    printf("%s ", ShownName(name).text());
   }
   putchar('\n');
   return true;

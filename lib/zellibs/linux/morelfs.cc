@@ -31,14 +31,27 @@ uint32_t Saturated(uint64_t value) {
   return value > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(value);
 }
 
-// Whether a mount shows a part of a file system that is mounted whole elsewhere.
-bool IsPart(const MountTable &mounts, const Mount &mount) {
-  if (strcmp(mount.root, "/") == 0) return false;
+bool IsWhole(const Mount &mount) {
+  return strcmp(mount.root, "/") == 0;
+}
+
+bool IsSameFileSystem(const Mount &a, const Mount &b) {
+  return a.major == b.major && a.minor == b.minor;
+}
+
+// Whether a file system that is mounted in several places is rather shown at `other`: where it is
+// mounted whole, then at the shortest point, then at the first.
+bool IsBetterShownAt(const Mount &other, const Mount &mount) {
+  if (other.hidden || !IsSameFileSystem(other, mount)) return false;
+  if (strcmp(other.root, mount.root) != 0) return IsWhole(other) && !IsWhole(mount);
+  const size_t length = strlen(mount.point);
+  const size_t otherLength = strlen(other.point);
+  return otherLength != length ? otherLength < length : &other < &mount;
+}
+
+bool IsShownElsewhere(const MountTable &mounts, const Mount &mount) {
   for (const Mount &other : mounts.mounts) {
-    if (!other.hidden && other.major == mount.major && other.minor == mount.minor &&
-        strcmp(other.root, "/") == 0) {
-      return true;
-    }
+    if (IsBetterShownAt(other, mount)) return true;
   }
   return false;
 }
@@ -51,13 +64,26 @@ KIF_Status ReadVolumes() {
   for (const Mount &mount : snapshot->mounts.mounts) {
     const bool isTardisk = IsOneOf(mount.type, kArchiveTypes);
     if (!isTardisk && !IsOneOf(mount.type, kMemoryTypes)) continue;
-    if (mount.hidden || IsPart(snapshot->mounts, mount)) continue;
-    Volume volume = {&mount, isTardisk, ""};
-    CopyText(volume.name, sizeof(volume.name), mount.point, strlen(mount.point));
-    if (!snapshot->volumes.Append(volume)) return KIF_STATUS_NO_MEMORY;
+    if (mount.hidden || IsShownElsewhere(snapshot->mounts, mount)) continue;
+    if (!snapshot->volumes.Append(Volume{&mount, isTardisk})) return KIF_STATUS_NO_MEMORY;
   }
   snapshot->read = true;
   return KIF_STATUS_OK;
+}
+
+KIF_Status ReadSpace(const Volume &volume, struct statfs *space) {
+  Descriptor folder;
+  const KIF_Status status = OpenVolume(volume, &folder);
+  if (status != KIF_STATUS_OK) return status;
+  return fstatfs(folder.fd(), space) == 0 ? KIF_STATUS_OK : StatusOfErrno(errno);
+}
+
+// A ramfs, and a tmpfs without a limit, which the kernel does not count.
+bool HasNoSize(const Volume &volume) {
+  if (volume.isTardisk) return false;
+  struct statfs space;
+  return strcmp(volume.mount->type, "ramfs") == 0 ||
+         (ReadSpace(volume, &space) == KIF_STATUS_OK && space.f_blocks == 0);
 }
 
 KIF_Status ListVolumes(bool tardisks, KIF_ParamList *list) {
@@ -65,7 +91,8 @@ KIF_Status ListVolumes(bool tardisks, KIF_ParamList *list) {
   KIF_Status status = NeedVolumes(true, &table);
   if (status != KIF_STATUS_OK) return status;
   for (const Volume &volume : table->volumes) {
-    if (volume.isTardisk == tardisks) status = KIF_ParamListAddString(list, volume.name);
+    if (volume.isTardisk != tardisks || HasNoSize(volume)) continue;
+    status = KIF_ParamListAddString(list, volume.mount->point);
     if (status != KIF_STATUS_OK) return status;
   }
   return KIF_STATUS_OK;
@@ -78,18 +105,11 @@ KIF_Status FindVolume(const KIF_ParamList *list, bool isTardisk, const Volume **
   const char *name = TextAt(list, 0);
   for (const Volume &candidate : table->volumes) {
     *volume = &candidate;
-    if (candidate.isTardisk == isTardisk && strcmp(candidate.name, name) == 0) {
+    if (candidate.isTardisk == isTardisk && strcmp(candidate.mount->point, name) == 0) {
       return KIF_STATUS_OK;
     }
   }
   return KIF_STATUS_NOT_FOUND;
-}
-
-KIF_Status ReadSpace(const Volume &volume, struct statfs *space) {
-  Descriptor folder;
-  const KIF_Status status = OpenVolume(volume, &folder);
-  if (status != KIF_STATUS_OK) return status;
-  return fstatfs(folder.fd(), space) == 0 ? KIF_STATUS_OK : StatusOfErrno(errno);
 }
 
 // The size of the device below an archive, which a tree of files can tell: a number of sectors.
@@ -127,9 +147,8 @@ bool IsLayer(const char *layers, const char *point) {
   return false;
 }
 
-// Whether a volume is the root file system or a lower layer of it.
-bool IsUsedToBoot(const Volume &volume) {
-  const char *point = volume.mount->point;
+// Whether a mount is that of the root file system or of a lower layer of it.
+bool IsBelowRoot(const char *point) {
   if (strcmp(point, "/") == 0) return true;
   for (const Mount &root : snapshot->mounts.mounts) {
     if (root.hidden || strcmp(root.point, "/") != 0 || strcmp(root.type, "overlay") != 0) continue;
@@ -141,6 +160,14 @@ bool IsUsedToBoot(const Volume &volume) {
       if (*layers == '+') ++layers;
       if (*layers == '=' && IsLayer(layers + 1, point)) return true;
     }
+  }
+  return false;
+}
+
+// A layer may be named by another of its mounts than the one that is shown.
+bool IsUsedToBoot(const Volume &volume) {
+  for (const Mount &mount : snapshot->mounts.mounts) {
+    if (IsSameFileSystem(mount, *volume.mount) && IsBelowRoot(mount.point)) return true;
   }
   return false;
 }

@@ -1,5 +1,6 @@
 // system_morelfs_inodes: the files of the volumes in memory, found by a walk, and the deleted ones
 // that processes still hold open.
+#include <errno.h>
 #include <fcntl.h>
 #include <limits.h>
 #include <sys/stat.h>
@@ -14,10 +15,14 @@
 #include "linux/linux_nodes.h"
 #include "linux/volumes.h"
 #include "records/morelfs.h"
+#include "status.h"
 
 namespace {
 
 constexpr size_t kNameSize = sizeof(InodeStats::name);
+
+// Stands first in the list for the files that the reader may not see. No file has this number.
+constexpr int64_t kUnseen = 0;
 
 struct Inode {
   uint64_t number;  // the file system's; what several volumes number alike is told apart on top
@@ -31,12 +36,13 @@ struct Inode {
 
 struct VolumeName {
   bool isTardisk;
-  char name[sizeof(Volume::name)];
+  char name[sizeof(InodeStats::ramdisk)];
 };
 
 // The files as they were at the last walk, by number.
 struct InodeTable {
   bool read = false;
+  bool partial = false;  // there may be deleted files that the reader may not see
   Array<Inode> inodes;
   Bytes paths;  // terminated texts
   Array<VolumeName> volumes;
@@ -129,25 +135,12 @@ KIF_Status WalkFolder(Walk *walk, uint32_t place, int top, bool watchMounts,
   return status;
 }
 
-// Whether the same files were seen below another point already.
-bool WasWalked(const VolumeTable &volumes, uint32_t place) {
-  const Mount &mount = *volumes.volumes[place].mount;
-  for (uint32_t i = 0; i < place; ++i) {
-    const Mount &other = *volumes.volumes[i].mount;
-    if (other.major == mount.major && other.minor == mount.minor &&
-        strcmp(other.root, mount.root) == 0) {
-      return true;
-    }
-  }
-  return false;
-}
-
 KIF_Status WalkVolume(Walk *walk, uint32_t place) {
   const Volume &volume = walk->volumes->volumes[place];
   Descriptor top;
   struct stat facts;
-  if (WasWalked(*walk->volumes, place) || OpenVolume(volume, &top) != KIF_STATUS_OK ||
-      fstat(top.fd(), &facts) != 0 || !IsOnVolume(facts, *volume.mount)) {
+  if (OpenVolume(volume, &top) != KIF_STATUS_OK || fstat(top.fd(), &facts) != 0 ||
+      !IsOnVolume(facts, *volume.mount)) {
     return KIF_STATUS_OK;
   }
   KIF_Status status = AddInode(place, facts, volume.mount->point, false);
@@ -160,59 +153,129 @@ KIF_Status WalkVolume(Walk *walk, uint32_t place) {
   return status;
 }
 
-// Finds the volume of the file behind a descriptor, without asking a file server that may not
-// answer for more than the kernel knows.
-bool FindVolumeOf(const VolumeTable &volumes, int descriptors, const char *name, uint32_t *place) {
-  struct statx facts;
-  const int flags = AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT;
-  if (statx(descriptors, name, flags, STATX_TYPE, &facts) != 0) return false;
+bool FindVolumeOf(const VolumeTable &volumes, uint32_t majorNumber, uint32_t minorNumber,
+                  uint32_t *place) {
   for (uint32_t i = 0; i < volumes.volumes.size(); ++i) {
     const Mount &mount = *volumes.volumes[i].mount;
     *place = i;
-    if (facts.stx_dev_major == mount.major && facts.stx_dev_minor == mount.minor) return true;
+    if (majorNumber == mount.major && minorNumber == mount.minor) return true;
   }
   return false;
 }
 
+// Finds the volume of the file behind a descriptor, without asking a file server that may not
+// answer for more than the kernel knows.
+bool FindVolumeBehind(const VolumeTable &volumes, int descriptors, const char *name,
+                      uint32_t *place) {
+  struct statx facts;
+  const int flags = AT_STATX_DONT_SYNC | AT_NO_AUTOMOUNT;
+  return statx(descriptors, name, flags, STATX_TYPE, &facts) == 0 &&
+         FindVolumeOf(volumes, facts.stx_dev_major, facts.stx_dev_minor, place);
+}
+
+constexpr char kDeleted[] = " (deleted)";
+constexpr size_t kDeletedLength = sizeof(kDeleted) - 1;
+
+// Takes what the kernel puts behind the path of a deleted file off it; false where it is not there.
+bool CutDeleted(char *path, size_t length) {
+  if (length <= kDeletedLength || strcmp(path + length - kDeletedLength, kDeleted) != 0) {
+    return false;
+  }
+  path[length - kDeletedLength] = '\0';
+  return true;
+}
+
+// The files of other users' processes are closed to an unprivileged reader.
+bool IsRefused(KIF_Status status) {
+  if (status == KIF_STATUS_NO_PERMISSION) snapshot->partial = true;
+  return status != KIF_STATUS_OK;
+}
+
 // Adds the file behind a descriptor where its link says that it was deleted.
 KIF_Status AddIfDeleted(const VolumeTable &volumes, int descriptors, const char *name) {
-  static constexpr char kDeleted[] = " (deleted)";
-  constexpr size_t kDeletedLength = sizeof(kDeleted) - 1;
   char target[PATH_MAX + kDeletedLength];
   size_t length;
-  if (ReadLinkBelow(descriptors, name, target, sizeof(target), &length) != KIF_STATUS_OK ||
-      length <= kDeletedLength || strcmp(target + length - kDeletedLength, kDeleted) != 0) {
+  if (IsRefused(ReadLinkBelow(descriptors, name, target, sizeof(target), &length)) ||
+      !CutDeleted(target, length)) {
     return KIF_STATUS_OK;
   }
   struct stat facts;
   uint32_t place;
-  if (!FindVolumeOf(volumes, descriptors, name, &place) ||
+  if (!FindVolumeBehind(volumes, descriptors, name, &place) ||
       fstatat(descriptors, name, &facts, AT_NO_AUTOMOUNT) != 0 || facts.st_nlink != 0) {
     return KIF_STATUS_OK;
   }
-  target[length - kDeletedLength] = '\0';
   return AddInode(place, facts, target, true);
 }
 
-// The processes of others are closed to an unprivileged reader.
+KIF_Status WalkDescriptors(const VolumeTable &volumes, int process) {
+  DirectoryReader descriptors;
+  if (IsRefused(descriptors.OpenBelow(process, "fd"))) return KIF_STATUS_OK;
+  KIF_Status status = KIF_STATUS_OK;
+  while (status == KIF_STATUS_OK) {
+    const char *name = descriptors.Next();
+    if (name == nullptr) break;
+    status = AddIfDeleted(volumes, descriptors.fd(), name);
+  }
+  return status;
+}
+
+// Adds the file of one line of /proc/PID/maps, whose path says that it was deleted, see proc(5):
+// "7f0000000000-7f0000001000 r--p 00000000 00:19 1234      /dev/shm/x (deleted)".
+KIF_Status AddMapping(const VolumeTable &volumes, int process, const char *line) {
+  unsigned long start;
+  unsigned long end;
+  unsigned majorNumber;
+  unsigned minorNumber;
+  int path = 0;
+  if (sscanf(line, "%lx-%lx %*s %*s %x:%x %*s %n", &start, &end, &majorNumber, &minorNumber,
+             &path) != 4 ||
+      path == 0) {
+    return KIF_STATUS_OK;
+  }
+  uint32_t place;
+  if (!FindVolumeOf(volumes, majorNumber, minorNumber, &place)) return KIF_STATUS_OK;
+  char link[64];
+  snprintf(link, sizeof(link), "map_files/%lx-%lx", start, end);
+  struct stat facts;
+  if (fstatat(process, link, &facts, AT_NO_AUTOMOUNT) != 0) {
+    (void)IsRefused(StatusOfErrno(errno));
+    return KIF_STATUS_OK;
+  }
+  return facts.st_nlink == 0 ? AddInode(place, facts, line + path, true) : KIF_STATUS_OK;
+}
+
+// The lines tell which of the many mappings have to be looked at.
+KIF_Status WalkMappings(const VolumeTable &volumes, int process) {
+  Descriptor file;
+  Bytes text;
+  if (IsRefused(OpenBelow(process, "maps", O_RDONLY, &file))) return KIF_STATUS_OK;
+  KIF_Status status = ReadWhole(file, &text);
+  if (status != KIF_STATUS_OK) return status == KIF_STATUS_NO_MEMORY ? status : KIF_STATUS_OK;
+  char *rest;
+  for (char *line = strtok_r(text.data(), "\n", &rest); line != nullptr && status == KIF_STATUS_OK;
+       line = strtok_r(nullptr, "\n", &rest)) {
+    if (CutDeleted(line, strlen(line))) status = AddMapping(volumes, process, line);
+  }
+  return status;
+}
+
 KIF_Status WalkProcesses(const VolumeTable &volumes) {
   DirectoryReader processes;
   KIF_Status status = processes.Open("/proc");
+  bool seesFirst = false;
   while (status == KIF_STATUS_OK) {
-    const char *process = processes.Next();
-    if (process == nullptr) return processes.status();
-    if (process[0] < '1' || process[0] > '9') continue;
-    char path[300];
-    snprintf(path, sizeof(path), "%s/fd", process);
-    DirectoryReader descriptors;
-    if (descriptors.OpenBelow(processes.fd(), path) != KIF_STATUS_OK) continue;
-    while (status == KIF_STATUS_OK) {
-      const char *name = descriptors.Next();
-      if (name == nullptr) break;
-      status = AddIfDeleted(volumes, descriptors.fd(), name);
-    }
+    const char *name = processes.Next();
+    if (name == nullptr) break;
+    if (name[0] < '1' || name[0] > '9') continue;
+    if (strcmp(name, "1") == 0) seesFirst = true;
+    Descriptor process;
+    if (OpenBelow(processes.fd(), name, O_PATH | O_DIRECTORY, &process) != KIF_STATUS_OK) continue;
+    status = WalkDescriptors(volumes, process.fd());
+    if (status == KIF_STATUS_OK) status = WalkMappings(volumes, process.fd());
   }
-  return status;
+  if (!seesFirst) snapshot->partial = true;  // processes of others are hidden
+  return status == KIF_STATUS_OK ? processes.status() : status;
 }
 
 int CompareNumbers(const void *left, const void *right) {
@@ -260,7 +323,7 @@ void NumberInodes(Array<Inode> *inodes) {
 KIF_Status KeepVolumeNames(const VolumeTable &volumes) {
   for (const Volume &volume : volumes.volumes) {
     VolumeName name = {volume.isTardisk, ""};
-    memcpy(name.name, volume.name, sizeof(name.name));
+    CopyText(name.name, sizeof(name.name), volume.mount->point, strlen(volume.mount->point));
     if (!snapshot->volumes.Append(name)) return KIF_STATUS_NO_MEMORY;
   }
   return KIF_STATUS_OK;
@@ -268,6 +331,7 @@ KIF_Status KeepVolumeNames(const VolumeTable &volumes) {
 
 KIF_Status ReadInodes() {
   snapshot->read = false;
+  snapshot->partial = false;
   snapshot->inodes.Clear();
   snapshot->paths.Clear();
   snapshot->volumes.Clear();
@@ -290,6 +354,7 @@ KIF_Status ReadInodes() {
 
 KIF_Status ListInodes(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *list) {
   KIF_Status status = ReadInodes();
+  if (status == KIF_STATUS_OK && snapshot->partial) status = KIF_ParamListAddInt(list, kUnseen);
   for (size_t i = 0; status == KIF_STATUS_OK && i < snapshot->inodes.size(); ++i) {
     status = KIF_ParamListAddInt(list, static_cast<int64_t>(snapshot->inodes[i].number));
   }
@@ -299,9 +364,11 @@ KIF_Status ListInodes(const NodeInfo &, const KIF_ParamList *, KIF_ParamList *li
 KIF_Status GetInode(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   const KIF_Status status = snapshot->read ? KIF_STATUS_OK : ReadInodes();
   if (status != KIF_STATUS_OK) return status;
+  const int64_t number = Integer(instance, 0);
+  if (number == kUnseen && snapshot->partial) return KIF_STATUS_NO_PERMISSION;
   if (snapshot->inodes.size() == 0) return KIF_STATUS_NOT_FOUND;
   Inode wanted = {};
-  wanted.number = static_cast<uint64_t>(Integer(instance, 0));
+  wanted.number = static_cast<uint64_t>(number);
   const auto *inode = static_cast<const Inode *>(bsearch(
       &wanted, snapshot->inodes.begin(), snapshot->inodes.size(), sizeof(Inode), CompareNumbers));
   if (inode == nullptr) return KIF_STATUS_NOT_FOUND;

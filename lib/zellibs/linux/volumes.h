@@ -10,7 +10,6 @@
 struct Volume {
   const Mount *mount;
   bool isTardisk;
-  char name[128];  // the mount's point, printable
 };
 
 // The volumes, as they were when they were last asked for, in the order of their names.
