@@ -129,6 +129,7 @@ void FormatSize(uint64_t bytes, char *buffer, size_t size) {
 
 __attribute__((visibility("default"))) int main(int argc, char **argv) {
   OccupyStandardStreams();
+  OpenOutput();
   const bool programForm = FinalComponent(argv[0]).starts_with(kProgramName);
   CheckHost(argc, argv);
   if (programForm && argc >= 4 && IsCacheOption(argv[1])) {
@@ -150,6 +151,5 @@ __attribute__((visibility("default"))) int main(int argc, char **argv) {
     InvokedWithCache = 0;
   }
   CheckSignature();
-  OpenOutput();
   return CloseOutput(RunTool(argc, argv));
 }

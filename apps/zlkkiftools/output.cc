@@ -4,8 +4,6 @@
 #include <signal.h>
 #include <string.h>
 
-#include "kiftools.h"
-
 namespace {
 
 constexpr size_t kBlockSize = 1 << 16;
@@ -37,6 +35,6 @@ int CloseOutput(int status) {
   const bool failed = !WriteOut();
   if (!failedBefore && !failed) return status;
   const int reason = writeError != 0 ? writeError : errno;
-  if (reason != EPIPE) Warning("zlkkiftools: write error: %s\n", strerror(reason));
+  if (reason != EPIPE) fprintf(stderr, "zlkkiftools: write error: %s\n", strerror(reason));
   return (status & 0xff) == 0 ? 1 : status;  // the system keeps eight bits
 }

@@ -12,6 +12,7 @@
 
 #include "base/io.h"
 #include "base/shown.h"
+#include "output.h"
 
 namespace {
 
@@ -19,7 +20,7 @@ constexpr size_t kLongestPath = 255;
 constexpr size_t kLongestLine = 255;
 
 [[noreturn]] void EndWith(const char *message) {
-  fputs(message, stderr);
+  fputs(message, Messages());
   exit(1);
 }
 
@@ -76,7 +77,7 @@ void PciIdsFileList::Read(int descriptor, File *file) {
   const auto size = static_cast<uint64_t>(status.st_size);
   if (size < SIZE_MAX) file->bytes = static_cast<char *>(malloc(static_cast<size_t>(size)));
   if (file->bytes == nullptr) {
-    fprintf(stderr, "Not enough memory for file %s\n", Printable(file->path).text());
+    fprintf(Messages(), "Not enough memory for file %s\n", Printable(file->path).text());
     return;
   }
   ReadAt(descriptor, file->bytes, static_cast<size_t>(size), 0, &file->size);

@@ -9,6 +9,7 @@
 
 #include "base/everlasting.h"
 #include "base/shown.h"
+#include "output.h"
 #include "pci/ids_line.h"
 
 const char not_avail_prefix[] = "Name not available for ";
@@ -60,7 +61,7 @@ void CopyName(char (&field)[Room], std::string_view name) {
 }
 
 void ReportMalformed(int message) {
-  fprintf(stderr, "%s: line %d improperly formatted(%d)\n",
+  fprintf(Messages(), "%s: line %d improperly formatted(%d)\n",
           Printable(idsFiles->CurrentPath()).text(), idsFiles->LineNumber(), message);
 }
 
@@ -112,11 +113,11 @@ bool AllocateTables() {
   PciDevTable = AllocateRows<DeviceRow>(ndevid);
   const bool haveDevices = VendorTable != nullptr && PciDevTable != nullptr;
   if (!haveDevices) {
-    fprintf(stderr, "couldn't allocate PciDevTable (%zu bytes)\n", ndevid * sizeof(PciDevEntry));
+    fprintf(Messages(), "couldn't allocate PciDevTable (%zu bytes)\n", ndevid * sizeof(PciDevEntry));
   }
   PciClassCodeTable = AllocateRows<PciClassCodeEntry>(nclass);
   if (PciClassCodeTable == nullptr) {
-    fprintf(stderr, "couldn't allocate PciClassCodeTable (%zu bytes)\n",
+    fprintf(Messages(), "couldn't allocate PciClassCodeTable (%zu bytes)\n",
             nclass * sizeof(PciClassCodeEntry));
   }
   return haveDevices && PciClassCodeTable != nullptr;
@@ -159,7 +160,7 @@ bool AddDevice(DevicePass *pass, std::string_view line) {
   uint32_t number = pass->deviceID;
   std::string_view name;  // stays without a text when there is none in the line
   if (!ParseIdAndName(TextFrom(line, 1), kDeviceNameRoom, &number, &name) && !pass->HasVendor()) {
-    fprintf(stderr, "%s: can't synthesize device name for line %d\n",
+    fprintf(Messages(), "%s: can't synthesize device name for line %d\n",
             Printable(idsFiles->CurrentPath()).text(), idsFiles->LineNumber());
     return false;
   }
@@ -183,7 +184,7 @@ bool AddSubsystem(DevicePass *pass, std::string_view line) {
     return false;
   }
   if (!pass->HasVendor()) {
-    fprintf(stderr, "no vendor information for subvendor 0%04x: subsystem 0%04x",
+    fprintf(Messages(), "no vendor information for subvendor 0%04x: subsystem 0%04x",
             subVendorID & 0xffff, subDeviceID & 0xffff);
     return false;
   }
@@ -217,7 +218,7 @@ bool FillDevices() {
   }
   nvendor = pass.vendors;
   if (pass.devices == ndevid) return true;
-  fprintf(stderr, "parsing problem: devices %u ndevid %u\n", static_cast<unsigned>(pass.devices),
+  fprintf(Messages(), "parsing problem: devices %u ndevid %u\n", static_cast<unsigned>(pass.devices),
           static_cast<unsigned>(ndevid));
   return false;
 }
@@ -302,7 +303,7 @@ bool FillClasses() {
   }
   if (pass.subclassPending) StoreSubclass(&pass);
   if (pass.stored == nclass) return true;
-  fprintf(stderr, "internal error: classes %u nclass %u\n", static_cast<unsigned>(pass.stored),
+  fprintf(Messages(), "internal error: classes %u nclass %u\n", static_cast<unsigned>(pass.stored),
           static_cast<unsigned>(nclass));
   return false;
 }
@@ -310,11 +311,11 @@ bool FillClasses() {
 void CountEntries() {
   CountDevices();
   if (ndevid == 0) {
-    fputs("no device entries in the pci ids files\nPerhaps, corrupted file?\n", stderr);
+    fputs("no device entries in the pci ids files\nPerhaps, corrupted file?\n", Messages());
   }
   CountClasses();
   if (nclass == 0) {
-    fprintf(stderr, "no class entries in %s\nPerhaps, corrupted file?\n", kPublishedFile);
+    fprintf(Messages(), "no class entries in %s\nPerhaps, corrupted file?\n", kPublishedFile);
   }
   idsFiles->Rewind();
 }
@@ -396,7 +397,7 @@ bool BuildPciTablesFrom(PciIdsFileList files) {
   CountEntries();
   if (AllocateTables() && FillDevices() && FillClasses()) return true;
   ReleasePciTables();
-  fputs("Failed to build PCI tables\n", stderr);
+  fputs("Failed to build PCI tables\n", Messages());
   return false;
 }
 
