@@ -113,7 +113,8 @@ bool AllocateTables() {
   PciDevTable = AllocateRows<DeviceRow>(ndevid);
   const bool haveDevices = VendorTable != nullptr && PciDevTable != nullptr;
   if (!haveDevices) {
-    fprintf(Messages(), "couldn't allocate PciDevTable (%zu bytes)\n", ndevid * sizeof(PciDevEntry));
+    fprintf(Messages(), "couldn't allocate PciDevTable (%zu bytes)\n",
+            ndevid * sizeof(PciDevEntry));
   }
   PciClassCodeTable = AllocateRows<PciClassCodeEntry>(nclass);
   if (PciClassCodeTable == nullptr) {
@@ -218,8 +219,8 @@ bool FillDevices() {
   }
   nvendor = pass.vendors;
   if (pass.devices == ndevid) return true;
-  fprintf(Messages(), "parsing problem: devices %u ndevid %u\n", static_cast<unsigned>(pass.devices),
-          static_cast<unsigned>(ndevid));
+  fprintf(Messages(), "parsing problem: devices %u ndevid %u\n",
+          static_cast<unsigned>(pass.devices), static_cast<unsigned>(ndevid));
   return false;
 }
 
