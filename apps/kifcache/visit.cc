@@ -199,6 +199,7 @@ bool Walk::ShowAll(const VisitedNode &node, const flatbuffers::Vector<const Answ
 bool Walk::Describe(uint32_t place, VisitedNode *visited) {
   const flatbuffers::String &path = *file_.content->nodes()->Get(place)->path();
   visited->path = path.c_str();
+  if (strlen(visited->path) != path.size()) return false;  // it would stand for another's
   if (file_.header->minor_version() == 0) {
     const NodeInfo *known = FindNodeByPath(path.c_str(), path.size());
     if (known != nullptr) ::Describe(*known, &description_);
