@@ -27,11 +27,15 @@ Everlasting<CommandLines> snapshot;
 
 }  // namespace
 
-KIF_Status ReadCommandLineFile(int proc, int32_t id, char *text) {
-  char path[32];
+KIF_Status ReadCommandLineFile(int proc, int32_t id, int32_t thread, char *text) {
+  char path[48];
   char raw[kCommandLineRead];
   size_t length;
-  snprintf(path, sizeof(path), "%d/cmdline", id);
+  if (thread == id) {
+    snprintf(path, sizeof(path), "%d/cmdline", id);
+  } else {
+    snprintf(path, sizeof(path), "%d/task/%d/cmdline", id, thread);
+  }
   const KIF_Status status = ReadPieceBelow(proc, path, raw, sizeof(raw), &length);
   text[0] = '\0';
   if (status != KIF_STATUS_OK) return status;
@@ -69,7 +73,8 @@ KIF_Status TakeCommandLine(int proc, int32_t id, Process *process, char *text) {
   }
   CommandLines &last = *snapshot;
   if (last.process != id || !last.current) {
-    last.status = ReadCommandLineFile(proc, id, last.text);
+    const int32_t living = process != nullptr && process->living != 0 ? process->living : id;
+    last.status = ReadCommandLineFile(proc, id, living, last.text);
     last.process = id;
     // One that was listed has ended since, which is no failure to whoever walks the list.
     if (last.status == KIF_STATUS_NOT_FOUND && process != nullptr) {

@@ -4,8 +4,9 @@
 
 #include "linux/processes.h"
 
-// Reads the command line of a process below `proc`, an open /proc, as the record has it.
-KIF_Status ReadCommandLineFile(int proc, int32_t id, char *text);
+// Reads the command line of a process, which its thread `thread` tells, below `proc`, an open
+// /proc, as the record has it.
+KIF_Status ReadCommandLineFile(int proc, int32_t id, int32_t thread, char *text);
 
 // Keeps the command line of a process until it is taken. False without memory.
 bool KeepCommandLine(const char *text, Process *process);

@@ -6,6 +6,7 @@
 
 #include "base/everlasting.h"
 #include "linux/files.h"
+#include "linux/processes.h"
 #include "status.h"
 
 namespace {
@@ -21,8 +22,13 @@ Everlasting<KeptDirectory> snapshot;
 
 KIF_Status OpenProcessDirectory(int64_t process, bool fresh, int *directory) {
   if (fresh || process != snapshot->process) {
-    char path[32];
-    snprintf(path, sizeof(path), "/proc/%lld", static_cast<long long>(process));
+    char path[64];
+    const int32_t living = FindLivingThread(process);
+    if (living == process) {
+      snprintf(path, sizeof(path), "/proc/%lld", static_cast<long long>(process));
+    } else {
+      snprintf(path, sizeof(path), "/proc/%lld/task/%d", static_cast<long long>(process), living);
+    }
     snapshot->process = -1;
     const KIF_Status status = OpenHostFile(path, O_PATH | O_DIRECTORY, &snapshot->directory);
     if (status != KIF_STATUS_OK) return status;

@@ -1,4 +1,5 @@
-// The directory /proc/PID of the process whose files were asked for last: what is read below it is
+// The directory /proc/PID of the process whose files were asked for last, or that of a thread that
+// lives where the main one has ended: what is read below it is
 // of one process, even when the number goes to another one meanwhile.
 #pragma once
 

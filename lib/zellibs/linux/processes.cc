@@ -37,6 +37,7 @@ constexpr size_t kPathSize = 64;
 
 struct Picture {
   Level level = Level::kNothing;
+  bool cartelsListed = false;
   Descriptor proc;
   Array<Process> processes;    // by ID
   Array<Thread> threads;       // as they are listed
@@ -58,15 +59,50 @@ KIF_Status ReadThreadStat(int32_t process, int32_t thread, Stat *stat) {
   return ReadStat(snapshot->proc.fd(), path, stat);
 }
 
-void FillProcess(const Stat &stat, Process *process) {
+KIF_Status AppendThread(uint32_t process, int32_t id, const Stat &stat);
+KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers);
+
+// The first thread of a process, whose main thread has ended, that still runs; 0 where none does.
+KIF_Status SeekLivingThread(int32_t process, int32_t *living) {
+  char path[kPathSize];
+  DirectoryReader tasks;
+  Array<int32_t> ids;
+  *living = 0;
+  snprintf(path, sizeof(path), "%d/task", process);
+  if (tasks.OpenBelow(snapshot->proc.fd(), path) != KIF_STATUS_OK) return KIF_STATUS_OK;
+  if (ListNumbers(&tasks, &ids) == KIF_STATUS_NO_MEMORY) return KIF_STATUS_NO_MEMORY;
+  for (const int32_t id : ids) {
+    Stat stat;
+    snprintf(path, sizeof(path), "%d/stat", id);
+    const bool runs = id != process && ReadStat(tasks.fd(), path, &stat) == KIF_STATUS_OK;
+    if (!runs || IsDead(stat.state)) continue;
+    *living = id;
+    break;
+  }
+  return KIF_STATUS_OK;
+}
+
+// A foreign tree need not agree with what the kernel once counted.
+bool MayHaveOtherThreads(const Stat &stat) {
+  return stat.threads > 1 || IsForeignRoot();
+}
+
+KIF_Status FillProcess(const Stat &stat, Process *process) {
   process->hasStat = true;
   process->parent = stat.parent;
   process->group = stat.group;
   process->session = stat.session;
-  process->threads = stat.threads;
   process->startTicks = stat.startTicks;
   process->isKernel = stat.isKernel;
-  process->isZombie = IsDead(stat.state);
+  process->living = process->id;
+  if (IsDead(stat.state)) {
+    process->living = 0;
+    const KIF_Status status =
+        MayHaveOtherThreads(stat) ? SeekLivingThread(process->id, &process->living) : KIF_STATUS_OK;
+    if (status != KIF_STATUS_OK) return status;
+  }
+  process->isZombie = process->living == 0;
+  return KIF_STATUS_OK;
 }
 
 void FillThread(const Stat &stat, Thread *thread) {
@@ -104,6 +140,7 @@ KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers) {
 // Begins a new picture: nothing in it but /proc, open, and its processes' IDs in `ids`.
 KIF_Status BeginPicture(Array<int32_t> *ids) {
   snapshot->level = Level::kNothing;
+  snapshot->cartelsListed = false;
   snapshot->processes.Clear();
   snapshot->threads.Clear();
   snapshot->byId.Clear();
@@ -115,12 +152,13 @@ KIF_Status BeginPicture(Array<int32_t> *ids) {
   if (status != KIF_STATUS_OK) return status;
   status = ListNumbers(&proc, ids);
   if (status != KIF_STATUS_OK) return status;
+  if (ids->size() == 0) return KIF_STATUS_NOT_FOUND;
   return OpenBelow(proc.fd(), ".", O_PATH | O_DIRECTORY, &snapshot->proc);
 }
 
 Process NewProcess(int32_t id) {
   Process process = {};
-  process.id = id;
+  process.id = process.living = id;
   process.mainThread = kNoThread;
   process.commandLine = kNoCommandLine;
   return process;
@@ -152,7 +190,8 @@ KIF_Status AppendProcess(int32_t id, bool withThreads) {
   const KIF_Status read = ReadThreadStat(id, id, &stat);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
   if (read == KIF_STATUS_OK) {
-    FillProcess(stat, &process);
+    const KIF_Status filled = FillProcess(stat, &process);
+    if (filled != KIF_STATUS_OK) return filled;
   } else if (read != KIF_STATUS_NO_PERMISSION) {
     return KIF_STATUS_OK;  // gone
   }
@@ -163,9 +202,8 @@ KIF_Status AppendProcess(int32_t id, bool withThreads) {
     if (status != KIF_STATUS_OK) return status;
   }
   if (!snapshot->processes.Append(process)) return KIF_STATUS_NO_MEMORY;
-  // A foreign tree need not agree with what the kernel once counted.
-  const bool hasOthers = stat.threads > 1 || IsForeignRoot();
-  return withThreads && hasOthers ? AppendOtherThreads(place) : KIF_STATUS_OK;
+  const bool hasOthers = withThreads && MayHaveOtherThreads(stat);
+  return hasOthers ? AppendOtherThreads(place) : KIF_STATUS_OK;
 }
 
 KIF_Status TakePicture(Level level) {
@@ -239,10 +277,10 @@ KIF_Status ReadMainThread(Process *process) {
   if (process->mainThread != kNoThread) return KIF_STATUS_OK;
   Stat stat;
   KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
-  if (status == KIF_STATUS_OK && IsDead(stat.state)) status = KIF_STATUS_NOT_FOUND;
+  if (status == KIF_STATUS_OK) status = FillProcess(stat, process);
+  if (status == KIF_STATUS_OK && process->isZombie) status = KIF_STATUS_NOT_FOUND;
   process->isZombie = status == KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
-  FillProcess(stat, process);
   process->mainThread = static_cast<uint32_t>(snapshot->threads.size());
   return AppendThread(static_cast<uint32_t>(process - snapshot->processes.begin()), process->id,
                       stat);
@@ -261,10 +299,12 @@ KIF_Status AddUserspaces() {
 
 KIF_Status RefreshThread(Thread *thread) {
   Stat stat;
-  const int32_t process = snapshot->processes[thread->process].id;
-  const KIF_Status status = ReadThreadStat(process, thread->id, &stat);
+  Process *process = &snapshot->processes[thread->process];
+  KIF_Status status = ReadThreadStat(process->id, thread->id, &stat);
+  const bool hasEnded = status == KIF_STATUS_OK && IsDead(stat.state);
+  if (hasEnded && thread->id == process->id) status = FillProcess(stat, process);
   if (status != KIF_STATUS_OK) return status;
-  if (IsDead(stat.state)) return KIF_STATUS_NOT_FOUND;
+  if (hasEnded && (thread->id != process->id || process->isZombie)) return KIF_STATUS_NOT_FOUND;
   FillThread(stat, thread);
   return KIF_STATUS_OK;
 }
@@ -307,8 +347,7 @@ KIF_Status FindProgram(int32_t id) {
 KIF_Status TellByStat(Process *process) {
   Stat stat;
   const KIF_Status status = ReadThreadStat(process->id, process->id, &stat);
-  if (status == KIF_STATUS_OK) FillProcess(stat, process);
-  return status;
+  return status == KIF_STATUS_OK ? FillProcess(stat, process) : status;
 }
 
 KIF_Status AppendCartel(int32_t id) {
@@ -316,15 +355,19 @@ KIF_Status AppendCartel(int32_t id) {
   char text[kCommandLineSize];
   const KIF_Status program = FindProgram(id);
   if (program == KIF_STATUS_NOT_FOUND) return KIF_STATUS_OK;
-  const KIF_Status read = ReadCommandLineFile(snapshot->proc.fd(), id, text);
+  KIF_Status read = ReadCommandLineFile(snapshot->proc.fd(), id, id, text);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
-  if (read == KIF_STATUS_OK && !KeepCommandLine(text, &process)) return KIF_STATUS_NO_MEMORY;
   // In a tree of files a command line proves nothing.
   if ((read != KIF_STATUS_OK && program != KIF_STATUS_OK) || IsForeignRoot()) {
     const KIF_Status told = TellByStat(&process);
     if (told != KIF_STATUS_OK && read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
+    if (told == KIF_STATUS_NO_MEMORY) return told;
     if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
+    if (process.living != id) {
+      read = ReadCommandLineFile(snapshot->proc.fd(), id, process.living, text);
+    }
   }
+  if (read == KIF_STATUS_OK && !KeepCommandLine(text, &process)) return KIF_STATUS_NO_MEMORY;
   return snapshot->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
@@ -352,11 +395,16 @@ KIF_Status TakeThreads(const Thread **threads, size_t *count) {
 }
 
 KIF_Status TakeCartels() {
+  if (snapshot->level == Level::kThreads && !snapshot->cartelsListed) {
+    snapshot->cartelsListed = true;
+    return KIF_STATUS_OK;
+  }
   Array<int32_t> ids;
   KIF_Status status = BeginPicture(&ids);
   ClearCommandLines();
   for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) status = AppendCartel(ids[i]);
   if (status == KIF_STATUS_OK) snapshot->level = Level::kCartels;
+  snapshot->cartelsListed = true;
   return status;
 }
 
@@ -387,6 +435,12 @@ KIF_Status FindThread(int64_t id, ThreadValue value, const Thread **thread,
   *process = &snapshot->processes[found.process];
   if (value == ThreadValue::kInfo) AllowLastCommandLine((*process)->id);
   return KIF_STATUS_OK;
+}
+
+int32_t FindLivingThread(int64_t process) {
+  Process *found = FindProcess(process);
+  if (found != nullptr && !found->hasStat) (void)ReadMainThread(found);
+  return found != nullptr && found->living != 0 ? found->living : static_cast<int32_t>(process);
 }
 
 KIF_Status ForEachChild(int64_t parent, KIF_Status (*give)(int32_t id, void *context),

@@ -32,11 +32,6 @@ bool IsUser(const Process &process) {
   return process.hasStat && !process.isKernel;
 }
 
-// A process may go on without its main thread, which is then a zombie.
-bool HasEnded(const Process &process) {
-  return process.isZombie && process.threads <= 1;
-}
-
 // The place of a process by ID, or `count`.
 size_t PlaceOf(const Process *processes, size_t count, int32_t id) {
   const Process *place =
@@ -49,7 +44,7 @@ size_t PlaceOf(const Process *processes, size_t count, int32_t id) {
 void ReadPidNamespaces(int proc, Process *processes, size_t count) {
   char path[32];
   for (size_t i = 0; i < count; ++i) {
-    if (!IsUser(processes[i]) || HasEnded(processes[i])) continue;
+    if (!IsUser(processes[i]) || processes[i].isZombie) continue;
     snprintf(path, sizeof(path), "%d/ns/pid", processes[i].id);
     processes[i].pidNamespace = ReadPidNamespace(proc, path);
   }
@@ -95,7 +90,7 @@ KIF_Status NumberUserspaces(int proc, Process *processes, size_t count,
     // What nothing tells the namespace of is seen by the reader, in the reader's.
     if (process.pidNamespace == 0) process.pidNamespace = own;
     process.userspace = NumberOf(*userspaces, process.pidNamespace);
-    if (process.userspace == 0 && !HasEnded(process)) {
+    if (process.userspace == 0 && !process.isZombie) {
       const auto place = static_cast<uint32_t>(i);
       if (!userspaces->Append({process.pidNamespace, kNoRoot, place})) return KIF_STATUS_NO_MEMORY;
       process.userspace = static_cast<uint32_t>(userspaces->size());
