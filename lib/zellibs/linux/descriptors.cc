@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <stdio.h>
 #include <sys/stat.h>
+#include <sys/xattr.h>
 
 #include <algorithm>
 #include <cstddef>
@@ -24,7 +25,8 @@ struct KeptProcess {
   int64_t id = -1;
   Descriptor descriptors;    // its fd directory
   bool socketsRead = false;  // those of its network namespace are known
-  bool refused = false;      // the kernel refused a descriptor; it decides on processes as a whole
+  bool socketsReadAgain = false;
+  bool refused = false;  // the kernel refused a descriptor; it decides on processes as a whole
 };
 
 Everlasting<KeptProcess> snapshot;
@@ -32,7 +34,7 @@ Everlasting<KeptProcess> snapshot;
 void Keep(int64_t process, int descriptors) {
   snapshot->id = process;
   snapshot->descriptors.Reset(descriptors);
-  snapshot->socketsRead = snapshot->refused = false;
+  snapshot->socketsRead = snapshot->socketsReadAgain = snapshot->refused = false;
 }
 
 KIF_Status KeepProcess(int64_t process) {
@@ -96,23 +98,61 @@ const char *KindOf(const char *name, const char *target) {
   return KindOfMode(known ? file.stx_mode : S_IFREG);
 }
 
-KIF_Status ReadSocketsOfKept() {
-  if (snapshot->socketsRead) return KIF_STATUS_OK;
+KIF_Status ReadSocketsOfKept(bool again) {
+  bool *done = again ? &snapshot->socketsReadAgain : &snapshot->socketsRead;
+  if (*done) return KIF_STATUS_OK;
   int directory;
   KIF_Status status = OpenProcessDirectory(snapshot->id, false, &directory);
-  if (status == KIF_STATUS_OK) status = ReadSocketsOf(directory);
-  snapshot->socketsRead = status == KIF_STATUS_OK;
+  if (status == KIF_STATUS_OK) status = ReadSocketsOf(directory, again);
+  *done = status == KIF_STATUS_OK;
   return status;
 }
 
-// Puts the description of the socket in place of its link's text, where there is one.
-KIF_Status NameSocket(char *text, size_t size, size_t *length) {
+// The protocol of the socket behind a descriptor, as the kernel itself calls it; empty where it
+// does not say.
+void ReadProtocol(const char *name, char *text, size_t size) {
+  char path[64];
+  snprintf(path, sizeof(path), "/proc/self/fd/%d/%s", snapshot->descriptors.fd(), name);
+  const ssize_t length = getxattr(path, "system.sockprotoname", text, size - 1);
+  text[length > 0 ? length : 0] = '\0';
+}
+
+// Tells whether the tables say what a socket is: `protocol` is what its attribute says, and an
+// unknown one may be newer than they are. A foreign tree has no attributes.
+KIF_Status FindInTables(const char *name, uint64_t inode, char *protocol, size_t size,
+                        bool *found) {
+  SocketRow row = FindSocketRow(inode);
+  *found = row == SocketRow::kOther || (row == SocketRow::kUnix && IsForeignRoot());
+  if (*found || IsForeignRoot()) return KIF_STATUS_OK;
+  ReadProtocol(name, protocol, size);
+  const bool isUnix = IsUnixProtocol(protocol);
+  *found = row == SocketRow::kUnix && isUnix;
+  if (*found || !HasTable(protocol)) return KIF_STATUS_OK;
+  const KIF_Status status = ReadSocketsOfKept(true);
+  row = FindSocketRow(inode);
+  *found = row == SocketRow::kOther || (row == SocketRow::kUnix && isUnix);
+  return status;
+}
+
+// Puts the description of the socket in place of its link's text: what the tables say of it, else
+// its protocol.
+KIF_Status NameSocket(const char *name, char *text, size_t size, size_t *length) {
   const char *place = text + strlen(kSocket);
   uint64_t inode;
   if (!TakeNumber(&place, &inode)) return KIF_STATUS_OK;
   KIF_Status status = NoteHolder(snapshot->id, inode);
-  if (status == KIF_STATUS_OK) status = ReadSocketsOfKept();
-  if (status == KIF_STATUS_OK && DescribeSocket(inode, text, size)) *length = strlen(text);
+  if (status == KIF_STATUS_OK) status = ReadSocketsOfKept(false);
+  char protocol[64] = "";
+  bool found = false;
+  if (status == KIF_STATUS_OK) {
+    status = FindInTables(name, inode, protocol, sizeof(protocol), &found);
+  }
+  if (status != KIF_STATUS_OK) return status;
+  if (!found && protocol[0] != '\0') {
+    *length = static_cast<size_t>(snprintf(text, size, "%s", protocol));
+  } else if (found && DescribeSocket(inode, text, size)) {
+    *length = strlen(text);
+  }
   return status;
 }
 
@@ -161,7 +201,7 @@ KIF_Status GetDescriptor(const NodeInfo &, const KIF_ParamList *instance, void *
   status = ReadLink(name, text, sizeof(text), &length);
   if (status != KIF_STATUS_OK) return status;
   snprintf(descriptor->kind, sizeof(descriptor->kind), "%s", KindOf(name, text));
-  if (BeginsWith(text, kSocket)) status = NameSocket(text, sizeof(text), &length);
+  if (BeginsWith(text, kSocket)) status = NameSocket(name, text, sizeof(text), &length);
   CopyText(descriptor->description, sizeof(descriptor->description), text, length);
   return status;
 }

@@ -19,26 +19,29 @@ namespace {
 enum class Layout : uint8_t { kInternet, kUnix, kNetlink, kPacket };
 
 struct Table {
-  const char *file;      // in /proc/net
-  const char *protocol;  // as it is shown
+  const char *file;       // in /proc/net
+  const char *protocol;   // as it is shown
+  const char *attribute;  // what its sockets' attributes name
   Layout layout;
   uint8_t inodeField;  // fields of a line are counted from 0
 };
 
+// What an earlier table says of a socket counts: everyone may give a unix socket a name that looks
+// like a row of its table.
 constexpr Table kTables[] = {
-    {"unix", "unix", Layout::kUnix, 6},
-    {"tcp", "TCP", Layout::kInternet, 9},
-    {"tcp6", "TCP", Layout::kInternet, 9},
-    {"udp", "UDP", Layout::kInternet, 9},
-    {"udp6", "UDP", Layout::kInternet, 9},
-    {"udplite", "UDPLITE", Layout::kInternet, 9},
-    {"udplite6", "UDPLITE", Layout::kInternet, 9},
-    {"raw", "RAW", Layout::kInternet, 9},
-    {"raw6", "RAW", Layout::kInternet, 9},
-    {"icmp", "ICMP", Layout::kInternet, 9},
-    {"icmp6", "ICMP", Layout::kInternet, 9},
-    {"netlink", "netlink", Layout::kNetlink, 9},
-    {"packet", "packet", Layout::kPacket, 8},
+    {"tcp", "TCP", "TCP", Layout::kInternet, 9},
+    {"tcp6", "TCP6", "TCPv6", Layout::kInternet, 9},
+    {"udp", "UDP", "UDP", Layout::kInternet, 9},
+    {"udp6", "UDP6", "UDPv6", Layout::kInternet, 9},
+    {"udplite", "UDPLITE", "UDP-Lite", Layout::kInternet, 9},
+    {"udplite6", "UDPLITE6", "UDPLITEv6", Layout::kInternet, 9},
+    {"raw", "RAW", "RAW", Layout::kInternet, 9},
+    {"raw6", "RAW6", "RAWv6", Layout::kInternet, 9},
+    {"icmp", "ICMP", "PING", Layout::kInternet, 9},
+    {"icmp6", "ICMP6", "PINGv6", Layout::kInternet, 9},
+    {"netlink", "netlink", "NETLINK", Layout::kNetlink, 9},
+    {"packet", "packet", "PACKET", Layout::kPacket, 8},
+    {"unix", "unix", "UNIX", Layout::kUnix, 6},
 };
 
 // include/net/tcp_states.h
@@ -227,7 +230,7 @@ bool FormatInternet(const Table &table, const char *line, char *text, size_t siz
   FormatEndpoint(local, from);
   const bool isConnected = HasAddress(remote) || remote.port != 0;
   if (isConnected) FormatEndpoint(remote, to);
-  const bool hasState = strcmp(table.protocol, "TCP") == 0;
+  const bool hasState = strncmp(table.protocol, "TCP", 3) == 0;
   const char *state = hasState ? NameOf(kTcpStates, HexadecimalField(line, 3)) : nullptr;
   snprintf(text, size, "%s %s%s%s%s%s%s", table.protocol, from, isConnected ? "->" : "", to,
            state != nullptr ? " (" : "", state != nullptr ? state : "",
@@ -290,13 +293,47 @@ void FormatPacket(const char *line, char *text, size_t size) {
            type != nullptr ? type : "?");
 }
 
+// Takes the text of a namespace's tables, which stand behind one another, and all that is known
+// from it, out of the others'.
+void ForgetNamespace(uint64_t number) {
+  Sockets &all = *snapshot;
+  const auto isOf = [number](const Piece &piece) { return piece.number == number; };
+  const Piece *first = std::find_if(all.pieces.begin(), all.pieces.end(), isOf);
+  if (first == all.pieces.end()) return;
+  const Piece *end = std::find_if_not(first, static_cast<const Piece *>(all.pieces.end()), isOf);
+  const size_t from = first->begin;
+  const size_t to = end[-1].end;
+  memmove(all.texts.data() + from, all.texts.text() + to, all.texts.size() - to);
+  all.texts.Truncate(all.texts.size() - (to - from));
+  all.pieces.Truncate(static_cast<size_t>(
+      std::remove_if(all.pieces.begin(), all.pieces.end(), isOf) - all.pieces.begin()));
+  for (Piece &piece : all.pieces) {
+    if (piece.begin < to) continue;
+    piece.begin -= to - from;
+    piece.end -= to - from;
+  }
+  const auto isIn = [from, to](const Socket &socket) {
+    return socket.line >= from && socket.line < to;
+  };
+  all.byInode.Truncate(static_cast<size_t>(
+      std::remove_if(all.byInode.begin(), all.byInode.end(), isIn) - all.byInode.begin()));
+  for (Socket &socket : all.byInode) {
+    if (socket.line >= to) socket.line -= to - from;
+  }
+  all.namespaces.Truncate(static_cast<size_t>(
+      std::remove(all.namespaces.begin(), all.namespaces.end(), number) - all.namespaces.begin()));
+}
+
 }  // namespace
 
-KIF_Status ReadSocketsOf(int process) {
+KIF_Status ReadSocketsOf(int process, bool again) {
   uint64_t number;
   if (NamespaceOf(process, &number) != KIF_STATUS_OK) return KIF_STATUS_OK;
   const Array<uint64_t> &known = snapshot->namespaces;
-  if (std::find(known.begin(), known.end(), number) != known.end()) return KIF_STATUS_OK;
+  if (std::find(known.begin(), known.end(), number) != known.end()) {
+    if (!again) return KIF_STATUS_OK;
+    ForgetNamespace(number);
+  }
   Descriptor net;
   KIF_Status status = OpenTables(process, &net);
   if (status == KIF_STATUS_NO_RESOURCES) return status;
@@ -319,9 +356,28 @@ KIF_Status ReadSocketsOf(int process) {
   }
   std::sort(snapshot->byInode.begin(), snapshot->byInode.end(),
             [](const Socket &a, const Socket &b) {
-              return a.inode != b.inode ? a.inode < b.inode : a.line < b.line;
+              if (a.inode != b.inode) return a.inode < b.inode;
+              return a.table != b.table ? a.table < b.table : a.line < b.line;
             });
   return status;
+}
+
+SocketRow FindSocketRow(uint64_t inode) {
+  const Socket *socket = FindSocket(inode);
+  if (socket == nullptr) return SocketRow::kNone;
+  const bool isUnix = kTables[socket->table].layout == Layout::kUnix;
+  return isUnix ? SocketRow::kUnix : SocketRow::kOther;
+}
+
+bool IsUnixProtocol(const char *attribute) {
+  return strncmp(attribute, "UNIX", 4) == 0;
+}
+
+bool HasTable(const char *attribute) {
+  const auto isIt = [attribute](const Table &table) {
+    return strcmp(table.attribute, attribute) == 0;
+  };
+  return IsUnixProtocol(attribute) || std::any_of(std::begin(kTables), std::end(kTables), isIt);
 }
 
 bool DescribeSocket(uint64_t inode, char *text, size_t size) {

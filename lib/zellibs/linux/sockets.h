@@ -7,9 +7,20 @@
 
 #include "zellibs.h"
 
-// Makes the sockets of a process's network namespace known, as far as they can be read. `process`
-// is its open directory. Fails only for want of memory or descriptors.
-KIF_Status ReadSocketsOf(int process);
+// Makes the sockets of a process's network namespace known, as far as they can be read; `again`
+// reads those that are known anew. `process` is its open directory. Fails only for want of memory
+// or descriptors.
+KIF_Status ReadSocketsOf(int process, bool again = false);
+
+// Which tables have a socket with an inode number. Everyone may give a unix socket a name that
+// looks like a row of the table, so that a row there alone proves nothing.
+enum class SocketRow : uint8_t { kNone, kUnix, kOther };
+SocketRow FindSocketRow(uint64_t inode);
+
+// Whether the protocol that a socket's attribute system.sockprotoname names is that of unix
+// sockets, and whether it is one that has a table.
+bool IsUnixProtocol(const char *attribute);
+bool HasTable(const char *attribute);
 
 // Writes protocol, addresses and state of a known socket, as numbers, to `text` (`size` bytes,
 // terminated): "TCP 127.0.0.1:22->10.0.0.1:5555 (ESTABLISHED)". False where the tables have none
