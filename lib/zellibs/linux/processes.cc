@@ -37,7 +37,10 @@ constexpr size_t kPathSize = 64;
 
 struct Picture {
   Level level = Level::kNothing;
-  bool cartelsListed = false;
+  bool hasAnyone = false;     // a process, listed or not
+  bool worldsListed = false;  // and no cartels yet
+  bool kernelThreadsSought = false;
+  bool hasKernelThreads = false;
   Descriptor proc;
   Array<Process> processes;    // by ID
   Array<Thread> threads;       // as they are listed
@@ -59,8 +62,22 @@ KIF_Status ReadThreadStat(int32_t process, int32_t thread, Stat *stat) {
   return ReadStat(snapshot->proc.fd(), path, stat);
 }
 
-KIF_Status AppendThread(uint32_t process, int32_t id, const Stat &stat);
-KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers);
+// A directory of numbers, ascending; other names are passed over.
+KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers) {
+  bool sorted = true;
+  while (const char *name = directory->Next()) {
+    const char *place = name;
+    uint64_t number;
+    if (!TakeNumber(&place, &number) || *place != '\0' || number == 0 || number > INT32_MAX) {
+      continue;
+    }
+    const auto id = static_cast<int32_t>(number);
+    sorted = sorted && (numbers->size() == 0 || (*numbers)[numbers->size() - 1] < id);
+    if (!numbers->Append(id)) return KIF_STATUS_NO_MEMORY;
+  }
+  if (!sorted) std::sort(numbers->begin(), numbers->end());
+  return directory->status();
+}
 
 // The first thread of a process, whose main thread has ended, that still runs; 0 where none does.
 KIF_Status SeekLivingThread(int32_t process, int32_t *living) {
@@ -120,27 +137,10 @@ KIF_Status AppendThread(uint32_t process, int32_t id, const Stat &stat) {
   return snapshot->threads.Append(thread) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
-// A directory of numbers, ascending; other names are passed over.
-KIF_Status ListNumbers(DirectoryReader *directory, Array<int32_t> *numbers) {
-  bool sorted = true;
-  while (const char *name = directory->Next()) {
-    const char *place = name;
-    uint64_t number;
-    if (!TakeNumber(&place, &number) || *place != '\0' || number == 0 || number > INT32_MAX) {
-      continue;
-    }
-    const auto id = static_cast<int32_t>(number);
-    sorted = sorted && (numbers->size() == 0 || (*numbers)[numbers->size() - 1] < id);
-    if (!numbers->Append(id)) return KIF_STATUS_NO_MEMORY;
-  }
-  if (!sorted) std::sort(numbers->begin(), numbers->end());
-  return directory->status();
-}
-
 // Begins a new picture: nothing in it but /proc, open, and its processes' IDs in `ids`.
 KIF_Status BeginPicture(Array<int32_t> *ids) {
   snapshot->level = Level::kNothing;
-  snapshot->cartelsListed = false;
+  snapshot->hasAnyone = snapshot->worldsListed = snapshot->kernelThreadsSought = false;
   snapshot->processes.Clear();
   snapshot->threads.Clear();
   snapshot->byId.Clear();
@@ -152,7 +152,6 @@ KIF_Status BeginPicture(Array<int32_t> *ids) {
   if (status != KIF_STATUS_OK) return status;
   status = ListNumbers(&proc, ids);
   if (status != KIF_STATUS_OK) return status;
-  if (ids->size() == 0) return KIF_STATUS_NOT_FOUND;
   return OpenBelow(proc.fd(), ".", O_PATH | O_DIRECTORY, &snapshot->proc);
 }
 
@@ -195,6 +194,7 @@ KIF_Status AppendProcess(int32_t id, bool withThreads) {
   } else if (read != KIF_STATUS_NO_PERMISSION) {
     return KIF_STATUS_OK;  // gone
   }
+  snapshot->hasAnyone = true;
   const auto place = static_cast<uint32_t>(snapshot->processes.size());
   if (!process.isZombie) {
     process.mainThread = static_cast<uint32_t>(snapshot->threads.size());
@@ -212,6 +212,7 @@ KIF_Status TakePicture(Level level) {
   for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) {
     status = AppendProcess(ids[i], level == Level::kThreads);
   }
+  if (status == KIF_STATUS_OK && !snapshot->hasAnyone) status = KIF_STATUS_NOT_FOUND;
   if (status != KIF_STATUS_OK) return status;
   status = AssignUserspaces(snapshot->proc.fd(), snapshot->processes.begin(),
                             snapshot->processes.size());
@@ -336,7 +337,7 @@ KIF_Status LookUpThread(int64_t id, ThreadValue value, uint32_t *place) {
 // reader may look. KIF_STATUS_NOT_SUPPORTED where the rest of the process has to tell: a tree need
 // not hold the links, and what is in a process group is no kernel thread, which costs less to see.
 KIF_Status FindProgram(int32_t id) {
-  if (IsForeignRoot() || getpgid(id) > 0) return KIF_STATUS_NOT_SUPPORTED;
+  if (IsForeignRoot() || getpgid(id) != 0) return KIF_STATUS_NOT_SUPPORTED;
   char path[kPathSize];
   char program[2];
   snprintf(path, sizeof(path), "%d/exe", id);
@@ -350,11 +351,25 @@ KIF_Status TellByStat(Process *process) {
   return status == KIF_STATUS_OK ? FillProcess(stat, process) : status;
 }
 
+// Whether the kernel's own threads are in this /proc: all of them descend from number 2.
+bool HasKernelThreads() {
+  if (!snapshot->kernelThreadsSought) {
+    Stat stat;
+    snapshot->kernelThreadsSought = true;
+    snapshot->hasKernelThreads = ReadThreadStat(2, 2, &stat) == KIF_STATUS_OK && stat.isKernel;
+  }
+  return snapshot->hasKernelThreads;
+}
+
 KIF_Status AppendCartel(int32_t id) {
   Process process = NewProcess(id);
   char text[kCommandLineSize];
   const KIF_Status program = FindProgram(id);
-  if (program == KIF_STATUS_NOT_FOUND) return KIF_STATUS_OK;
+  // A main thread that has ended shows no program, either.
+  if (program == KIF_STATUS_NOT_FOUND && HasKernelThreads()) {
+    snapshot->hasAnyone = true;
+    return KIF_STATUS_OK;
+  }
   KIF_Status read = ReadCommandLineFile(snapshot->proc.fd(), id, id, text);
   if (read == KIF_STATUS_NO_MEMORY || read == KIF_STATUS_NO_RESOURCES) return read;
   // In a tree of files a command line proves nothing.
@@ -362,12 +377,14 @@ KIF_Status AppendCartel(int32_t id) {
     const KIF_Status told = TellByStat(&process);
     if (told != KIF_STATUS_OK && read != KIF_STATUS_OK) return KIF_STATUS_OK;  // gone
     if (told == KIF_STATUS_NO_MEMORY) return told;
+    snapshot->hasAnyone = true;
     if (process.isKernel || process.isZombie) return KIF_STATUS_OK;
     if (process.living != id) {
       read = ReadCommandLineFile(snapshot->proc.fd(), id, process.living, text);
     }
   }
   if (read == KIF_STATUS_OK && !KeepCommandLine(text, &process)) return KIF_STATUS_NO_MEMORY;
+  snapshot->hasAnyone = true;
   return snapshot->processes.Append(process) ? KIF_STATUS_OK : KIF_STATUS_NO_MEMORY;
 }
 
@@ -389,22 +406,23 @@ KIF_Status IndexChildren() {
 KIF_Status TakeThreads(const Thread **threads, size_t *count) {
   snapshot->level = Level::kNothing;
   const KIF_Status status = TakePicture(Level::kThreads);
+  snapshot->worldsListed = status == KIF_STATUS_OK;
   *threads = snapshot->threads.begin();
   *count = snapshot->threads.size();
   return status;
 }
 
 KIF_Status TakeCartels() {
-  if (snapshot->level == Level::kThreads && !snapshot->cartelsListed) {
-    snapshot->cartelsListed = true;
+  if (snapshot->worldsListed) {
+    snapshot->worldsListed = false;
     return KIF_STATUS_OK;
   }
   Array<int32_t> ids;
   KIF_Status status = BeginPicture(&ids);
   ClearCommandLines();
   for (size_t i = 0; status == KIF_STATUS_OK && i < ids.size(); ++i) status = AppendCartel(ids[i]);
+  if (status == KIF_STATUS_OK && !snapshot->hasAnyone) status = KIF_STATUS_NOT_FOUND;
   if (status == KIF_STATUS_OK) snapshot->level = Level::kCartels;
-  snapshot->cartelsListed = true;
   return status;
 }
 
