@@ -4,6 +4,7 @@
 #include <sys/utsname.h>
 #include <unistd.h>
 
+#include "base/own_process.h"
 #include "kif/kif.h"
 #include "records/platform.h"
 
@@ -32,5 +33,5 @@ void TellOfBoot(const RecordingClock &clock, Facts *facts) {
   FILE *file = fopen("/proc/sys/kernel/random/boot_id", "re");
   if (file != nullptr && fgets(bootID, sizeof(bootID), file) != nullptr) facts->bootID = bootID;
   if (file != nullptr) fclose(file);
-  if (!clock.isFixed()) facts->recorderCartel = getpid();
+  if (!clock.isFixed()) facts->recorderCartel = OwnProcessInProc();
 }

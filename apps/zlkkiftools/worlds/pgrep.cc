@@ -2,6 +2,7 @@
 #include <stdio.h>
 #include <unistd.h>
 
+#include "base/own_process.h"
 #include "kiftools.h"
 #include "output.h"
 #include "tools.h"
@@ -34,7 +35,7 @@ int RefuseWithoutPattern() {
 }
 
 bool IsOwnCartel(int32_t cartelID) {
-  return cartelID == getpid() && !HostIsElsewhere();
+  return cartelID == OwnProcessInProc() && !HostIsElsewhere();
 }
 
 KIF_Status PrintIfSelected(const MatchedCartel &cartel, void *context) {

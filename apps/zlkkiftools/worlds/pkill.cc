@@ -7,6 +7,7 @@
 #include <string.h>
 #include <unistd.h>
 
+#include "base/own_process.h"
 #include "kiftools.h"
 #include "output.h"
 #include "tools.h"
@@ -100,6 +101,13 @@ bool SignalCartels(const char *patternText, bool wholeLine, int signal) {
 int PkillEntry(int argc, char **argv) {
   if (HostIsElsewhere()) {
     fputs("Using KIF cache is unsupported\n", Messages());
+    return 1;
+  }
+  // The numbers of a /proc that is mounted for another PID namespace are others' in this one.
+  const int32_t own = OwnProcessInProc();
+  if (own != getpid() && access("/proc/stat", F_OK) == 0) {
+    fputs("pkill: /proc shows another PID namespace, whose processes cannot be signalled\n",
+          Messages());
     return 1;
   }
   if (argc < 2) {
