@@ -61,7 +61,7 @@ KIF_Status AddFolder(uint8_t folder) {
 int CompareTables(const void *left, const void *right) {
   const auto *a = static_cast<const AcpiTable *>(left);
   const auto *b = static_cast<const AcpiTable *>(right);
-  const int order = strcmp(a->name, b->name);
+  const int order = strverscmp(a->name, b->name);
   return order != 0 ? order : a->folder - b->folder;
 }
 

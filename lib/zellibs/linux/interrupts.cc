@@ -1,6 +1,7 @@
 // hardware_interrupts: the numbered rows of /proc/interrupts.
 #include <fcntl.h>
 
+#include <algorithm>
 #include <cstddef>
 #include <cstring>
 
@@ -23,9 +24,9 @@ struct Interrupts {
   bool read = false;
   Bytes text;
   Array<Row> rows;
-  size_t cpus = 0;
+  Array<uint32_t> cpus;  // those of the columns, ascending
   size_t lastRow = 0;
-  size_t nextCpu = 0;
+  size_t nextColumn = 0;
   const char *nextCount = nullptr;  // null: none was read yet
 };
 
@@ -36,24 +37,31 @@ const char *SkipBlanks(const char *text) {
   return text;
 }
 
-size_t CountWords(const char *line) {
-  size_t count = 0;
-  for (line = SkipBlanks(line); *line != '\0' && *line != '\n'; line = SkipBlanks(line)) {
-    ++count;
-    line += strcspn(line, " \n");
-  }
-  return count;
-}
-
 const char *NextLine(const char *line) {
   line += strcspn(line, "\n");
   return *line == '\n' ? line + 1 : line;
 }
 
-// The first line names the columns, one for each CPU online; rows without a number are those of
-// the processor itself.
+// The first line names the columns, "CPU0 CPU2", one for each CPU online.
+KIF_Status FindColumns(const char *line) {
+  Array<uint32_t> &cpus = snapshot->cpus;
+  for (line = SkipBlanks(line); *line != '\0' && *line != '\n'; line = SkipBlanks(line)) {
+    const char *place = line + (strncmp(line, "CPU", 3) == 0 ? 3 : 0);
+    uint64_t number;
+    const size_t count = cpus.size();
+    const bool goesOn = TakeNumber(&place, &number) && number < UINT32_MAX &&
+                        (count == 0 || number > cpus[count - 1]);
+    if (!goesOn) return KIF_STATUS_OK;
+    if (!cpus.Append(static_cast<uint32_t>(number))) return KIF_STATUS_NO_MEMORY;
+    line += strcspn(line, " \n");
+  }
+  return KIF_STATUS_OK;
+}
+
+// Rows without a number are those of the processor itself.
 KIF_Status FindRows(const char *line) {
-  snapshot->cpus = CountWords(line);
+  const KIF_Status status = FindColumns(line);
+  if (status != KIF_STATUS_OK) return status;
   for (line = NextLine(line); *line != '\0'; line = NextLine(line)) {
     const char *place = SkipBlanks(line);
     uint64_t number;
@@ -67,6 +75,7 @@ KIF_Status ReadInterrupts() {
   snapshot->read = false;
   snapshot->text.Clear();
   snapshot->rows.Clear();
+  snapshot->cpus.Clear();
   snapshot->lastRow = 0;
   snapshot->nextCount = nullptr;
   Descriptor file;
@@ -91,19 +100,18 @@ KIF_Status FindRow(const KIF_ParamList *list, size_t *row) {
   return KIF_STATUS_NOT_FOUND;
 }
 
-// Moves behind the count of `cpu` in a row, and gives it. False where the row has no such column.
-bool TakeCount(size_t row, size_t cpu, const char **behind, uint64_t *count) {
-  if (cpu >= snapshot->cpus) return false;
+// Moves behind the count in a column of a row, and gives it. False where the row has none there.
+bool TakeCount(size_t row, size_t wanted, const char **behind, uint64_t *count) {
   const bool goesOn =
-      snapshot->nextCount != nullptr && row == snapshot->lastRow && cpu >= snapshot->nextCpu;
-  size_t column = goesOn ? snapshot->nextCpu : 0;
+      snapshot->nextCount != nullptr && row == snapshot->lastRow && wanted >= snapshot->nextColumn;
+  size_t column = goesOn ? snapshot->nextColumn : 0;
   const char *place = goesOn ? snapshot->nextCount : snapshot->rows[row].counts;
-  for (; column <= cpu; ++column) {
+  for (; column <= wanted; ++column) {
     place = SkipBlanks(place);
     if (!TakeNumber(&place, count)) return false;
   }
   snapshot->lastRow = row;
-  snapshot->nextCpu = column;
+  snapshot->nextColumn = column;
   snapshot->nextCount = place;
   *behind = place;
   return true;
@@ -128,7 +136,8 @@ const char *FindDevices(size_t row, size_t *length) {
   const char *start = snapshot->rows[row].counts;
   uint64_t count;
   *length = 0;
-  if (snapshot->cpus > 0 && !TakeCount(row, snapshot->cpus - 1, &start, &count)) return start;
+  const size_t columns = snapshot->cpus.size();
+  if (columns > 0 && !TakeCount(row, columns - 1, &start, &count)) return start;
   start = SkipBlanks(start);
   const char *end = start + strcspn(start, "\n");
   while (end > start && end[-1] == ' ') --end;
@@ -165,15 +174,19 @@ KIF_Status GetInterruptUsage(const NodeInfo &, const KIF_ParamList *instance, vo
   return status;
 }
 
-// PCPUs are numbered as the columns are: from 0, those online.
+// One that is offline has no column, and counts nothing.
 KIF_Status GetInterruptCount(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   size_t row;
   const KIF_Status status = FindRow(instance, &row);
   if (status != KIF_STATUS_OK) return status;
   const int64_t cpu = Integer(instance, 1);
-  uint64_t count;
+  const Array<uint32_t> &cpus = snapshot->cpus;
+  const uint32_t *column = std::lower_bound(cpus.begin(), cpus.end(), cpu);
+  if (cpu < 0 || column == cpus.end()) return KIF_STATUS_NOT_FOUND;
+  uint64_t count = 0;
   const char *behind;
-  if (cpu < 0 || !TakeCount(row, static_cast<size_t>(cpu), &behind, &count)) {
+  if (*column == cpu &&
+      !TakeCount(row, static_cast<size_t>(column - cpus.begin()), &behind, &count)) {
     return KIF_STATUS_NOT_FOUND;
   }
   static_cast<PcpuCount *>(record)->count = count;

@@ -1,12 +1,15 @@
 // system_ntpclock_upTime, sched_globalStats, sched_groups (load averages), the CPUs that a world
 // may run on, and hardware_cpu.
 #include <errno.h>
+#include <fcntl.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
 
+#include "base/own_process.h"
 #include "linux/files.h"
 #include "linux/linux_nodes.h"
 #include "linux/processes.h"
@@ -27,33 +30,59 @@ bool TakeHundredths(const char **text, uint32_t *hundredths) {
   return true;
 }
 
+struct OnlineCpus {
+  uint32_t count;
+  uint32_t end;  // the highest number, plus 1
+};
+
+bool AddCpus(uint64_t first, uint64_t last, OnlineCpus *cpus) {
+  if (last < first || last >= UINT32_MAX) return false;
+  cpus->count += static_cast<uint32_t>(last - first + 1);
+  cpus->end = std::max(cpus->end, static_cast<uint32_t>(last + 1));
+  return true;
+}
+
 // Documentation/admin-guide/cputopology.rst: a list of ranges, "0-3,8".
-KIF_Status CountOnlineCpus(uint32_t *online) {
-  char text[4096];
-  const KIF_Status status = ReadHostFile("/sys/devices/system/cpu/online", text, sizeof(text));
-  if (status != KIF_STATUS_OK) return status;
-  const char *place = text;
+bool ParseCpuList(const char *place, OnlineCpus *cpus) {
   uint64_t first;
-  *online = 0;
   while (TakeNumber(&place, &first)) {
     uint64_t last = first;
     if (*place == '-') {
       ++place;
-      if (!TakeNumber(&place, &last) || last < first) return KIF_STATUS_IO_ERROR;
+      if (!TakeNumber(&place, &last)) return false;
     }
-    *online += static_cast<uint32_t>(last - first + 1);
+    if (!AddCpus(first, last, cpus)) return false;
     if (*place != ',') break;
     ++place;
   }
-  return *online > 0 ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
+  return cpus->count > 0;
 }
 
-template <typename Record>
-KIF_Status PutOnlineCpus(Record *record) {
-  uint32_t online;
-  const KIF_Status status = CountOnlineCpus(&online);
-  if (status == KIF_STATUS_OK) record->numPcpus = online;
-  return status;
+// See proc(5), /proc/stat: a row for each CPU online, "cpu0 1 2 ...".
+KIF_Status CountRowsOfCpus(OnlineCpus *cpus) {
+  Descriptor file;
+  Bytes text;
+  KIF_Status status = OpenHostFile("/proc/stat", O_RDONLY, &file);
+  if (status == KIF_STATUS_OK) status = ReadWhole(file, &text);
+  if (status != KIF_STATUS_OK) return status;
+  for (const char *line = text.text(); *line != '\0';) {
+    const char *place = line + 3;
+    uint64_t number;
+    const bool isCpu = strncmp(line, "cpu", 3) == 0 && TakeNumber(&place, &number);
+    if (isCpu && !AddCpus(number, number, cpus)) return KIF_STATUS_IO_ERROR;
+    line += strcspn(line, "\n");
+    if (*line != '\0') ++line;
+  }
+  return cpus->count > 0 ? KIF_STATUS_OK : KIF_STATUS_NOT_FOUND;
+}
+
+KIF_Status ReadOnlineCpus(OnlineCpus *cpus) {
+  char text[4096];
+  *cpus = {};
+  const KIF_Status status = ReadHostFile("/sys/devices/system/cpu/online", text, sizeof(text));
+  if (status == KIF_STATUS_NOT_FOUND) return CountRowsOfCpus(cpus);
+  if (status != KIF_STATUS_OK) return status;
+  return ParseCpuList(text, cpus) ? KIF_STATUS_OK : KIF_STATUS_IO_ERROR;
 }
 
 // A mask of CPUs as a list of ranges.
@@ -80,7 +109,8 @@ void FormatCpus(const unsigned char *mask, size_t maskSize, char *text, size_t s
   }
 }
 
-// In a tree taken from elsewhere the kernel's own list stands in the thread's status.
+// Where the numbers are not those of this process's PID namespace, in a tree taken from elsewhere
+// too, the kernel's own list stands in the thread's status.
 KIF_Status ReadRecordedCpus(int64_t thread, char *text, size_t size) {
   const Thread *found;
   const Process *process;
@@ -135,11 +165,18 @@ KIF_Status GetUpTime(const NodeInfo &, const KIF_ParamList *, void *record) {
 }
 
 KIF_Status GetNumPcpus(const NodeInfo &, const KIF_ParamList *, void *record) {
-  return PutOnlineCpus(static_cast<PcpuRecord *>(record));
+  OnlineCpus cpus;
+  const KIF_Status status = ReadOnlineCpus(&cpus);
+  if (status == KIF_STATUS_OK) static_cast<PcpuRecord *>(record)->numPcpus = cpus.count;
+  return status;
 }
 
+// Interrupts are counted under the CPUs' own numbers, so those offline have a place too.
 KIF_Status GetCpuInfo(const NodeInfo &, const KIF_ParamList *, void *record) {
-  return PutOnlineCpus(static_cast<CpuInfo *>(record));
+  OnlineCpus cpus;
+  const KIF_Status status = ReadOnlineCpus(&cpus);
+  if (status == KIF_STATUS_OK) static_cast<CpuInfo *>(record)->numPcpus = cpus.end;
+  return status;
 }
 
 // The whole machine is group 0; there are no others.
@@ -164,6 +201,7 @@ KIF_Status GetLoadHistory(const NodeInfo &node, const KIF_ParamList *instance, v
 KIF_Status GetAffinity(const NodeInfo &, const KIF_ParamList *instance, void *record) {
   auto *affinity = static_cast<SchedAffinity *>(record);
   const int64_t id = instance->params[0].integer;
-  return IsForeignRoot() ? ReadRecordedCpus(id, affinity->cpuText, sizeof(affinity->cpuText))
-                         : ReadAllowedCpus(id, affinity->cpuText, sizeof(affinity->cpuText));
+  static const bool hasOwnNumbers = !IsForeignRoot() && OwnProcessInProc() == getpid();
+  return hasOwnNumbers ? ReadAllowedCpus(id, affinity->cpuText, sizeof(affinity->cpuText))
+                       : ReadRecordedCpus(id, affinity->cpuText, sizeof(affinity->cpuText));
 }
