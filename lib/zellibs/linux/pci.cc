@@ -170,14 +170,18 @@ void UseConfig(const ConfigSpace &config, PciConfigHeader *header) {
   header->subDeviceID = config.subDevice;
 }
 
-// The kernel's number of the function's interrupt.
-uint8_t ReadIrq(int function) {
+// The kernel's number of the function's interrupt: `msi`, the first of those that it sends as
+// messages, or that of its pin where it sends none.
+uint8_t ReadIrq(int function, uint64_t msi) {
   constexpr uint8_t kNone = 255;
+  uint64_t number = msi;
   char text[32];
-  if (!ReadAttribute(function, "irq", text, sizeof(text))) return kNone;
-  const char *place = text;
-  uint64_t number;
-  if (!TakeNumber(&place, &number) || number == 0 || number >= kNone) return kNone;
+  if (msi == 0) {
+    const char *place = text;
+    const bool isThere = ReadAttribute(function, "irq", text, sizeof(text));
+    if (!isThere || !TakeNumber(&place, &number)) return kNone;
+  }
+  if (number == 0 || number >= kNone) return kNone;
   return static_cast<uint8_t>(number);
 }
 
@@ -277,7 +281,7 @@ KIF_Status GetPciConfigHeader(const NodeInfo &, const KIF_ParamList *instance, v
   if (status != KIF_STATUS_OK) return status;
   const uint64_t msi = contents.hasMsi ? ReadFirstMsi(function) : 0;
   if (isSeen) UseInterruptsAndBus(config, msi != 0, header);
-  header->irq = ReadIrq(function);
+  header->irq = ReadIrq(function, msi);
   header->vector = static_cast<uint8_t>(msi);
   header->mFlags = MemberFlags(function, header->classCode, driver);
   header->moduleID = module;
