@@ -91,13 +91,21 @@ void DropRepeated(Values *values) {
   std::erase_if(*values, [&seen](const Value &value) { return !seen.insert(value).second; });
 }
 
+// Whether an answer shows that there is something to record; an empty list of worlds tells at least
+// that somebody looked.
+bool IsSubject(const Question &question, const HostAnswer &answer) {
+  if (question.kind != AnswerKind::kList) return question.node == kNode_hardware_cpu_cpuInfo;
+  return question.node == kNode_world || !answer.entries.empty();
+}
+
 class Recorder {
  public:
   Recorder(const RecordingClock &clock, HostModel *model) : clock_(clock), model_(model) {
     for (const NodeInfo &node : kNodes) models_[IndexOf(node)] = model->NodeOf(node.path);
   }
 
-  void Record();
+  // False where the host has neither processes nor devices.
+  bool Record();
 
  private:
   // Asks for one answer and stores it; all the rest finds out what to ask for.
@@ -132,10 +140,12 @@ class Recorder {
   std::set<Values> cartelsOfWorlds_;
   uint64_t omitted_[kNodeCount] = {};
   uint64_t refused_[kNodeCount] = {};
+  bool isAbsent_[kNodeCount] = {};
+  bool hasSubjects_ = false;
   Progress progress_{"answers"};
 };
 
-void Recorder::Record() {
+bool Recorder::Record() {
   for (size_t row = 0; row < kNodeCount;) {
     const NodeInfo &node = kNodes[row];
     size_t end = row + 1;
@@ -144,6 +154,7 @@ void Recorder::Record() {
     row = end;
   }
   TellLacks();
+  return hasSubjects_;
 }
 
 // Records the rows from `first` up to `end`, which are of one group and share their instances.
@@ -188,6 +199,9 @@ void Recorder::TellLacks() {
     if (refused != 0) {
       lacks.push_back({node.path, cache::Reason::Rights, KIF_STATUS_NO_PERMISSION, refused});
     }
+    if (isAbsent_[IndexOf(node)]) {
+      lacks.push_back({node.path, cache::Reason::Absent, KIF_STATUS_NOT_FOUND, 1});
+    }
     if (omitted != 0) lacks.push_back({node.path, cache::Reason::Limits, 0, omitted});
   }
 }
@@ -200,6 +214,11 @@ void Recorder::RecordAnswer(const Question &question, HostAnswer *answer) {
     return;
   }
   asker_.Ask(question, answer);
+  // What was listed and is gone has the answer of a live host.
+  if (question.node == kNode_userworld_cartel_cmdline && answer->status == KIF_STATUS_NOT_FOUND) {
+    answer->status = KIF_STATUS_NO_COMMAND_LINE;
+  }
+  hasSubjects_ = hasSubjects_ || (answer->status == 0 && IsSubject(question, *answer));
   // A tree of files may name a process twice.
   if (question.kind == AnswerKind::kList && EntriesSelect(node)) DropRepeated(&answer->entries);
   Store(question, *answer);
@@ -214,7 +233,9 @@ void Recorder::Store(const Question &question, const HostAnswer &answer) {
     if (answer.content.lengthStatus == KIF_STATUS_NOT_FOUND) return;
     model_->AddContent(model, question.instance, answer.content);
   } else if (answer.status == KIF_STATUS_NOT_FOUND) {
-    return;
+    // A whole subject of the tools that the host does not have.
+    const bool isWhole = question.kind == AnswerKind::kList && question.instance.empty();
+    if (isWhole && kNodes[question.node].hasVariable) isAbsent_[question.node] = true;
   } else if (question.kind == AnswerKind::kList) {
     model_->AddList(model, question.instance, answer.status, answer.entries);
   } else {
@@ -368,7 +389,10 @@ bool RecordHost(HostModel *model) {
   const RecordingClock clock(isThisMachine);
   if (isThisMachine) TellOfBoot(clock, &facts);
   Moments whole = clock.Begin("recording");
-  Recorder(clock, model).Record();
+  if (!Recorder(clock, model).Record()) {
+    fputs("kifcache: the host has neither processes nor devices to record\n", stderr);
+    return false;
+  }
   clock.End(&whole);
   facts.begin = whole.begin / kNanoseconds;
   facts.end = whole.end / kNanoseconds;
